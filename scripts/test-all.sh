@@ -1,0 +1,50 @@
+#!/usr/bin/env bash
+# Builds and runs every test suite: native (dev), ThreadSanitizer, AddressSanitizer+UBSan and
+# the Windows build under Wine, then the extra checks in scripts/checks/ (fuzzing, end-to-end
+# runs). Ends with one line "N passed, N failed" over everything that ran.
+set -uo pipefail
+cd "$(dirname "$0")/.."
+bash scripts/setup.sh || exit 1
+
+export WINEDEBUG=-all
+export WINEPREFIX="${WINEPREFIX:-$PWD/build/wineprefix}"
+export CCACHE_DIR="${CCACHE_DIR:-$HOME/.cache/ccache}"
+launcher=(); command -v ccache >/dev/null && launcher=(-DCMAKE_C_COMPILER_LAUNCHER=ccache -DCMAKE_CXX_COMPILER_LAUNCHER=ccache)
+
+passed=0; failed=0
+count_ctest() {  # adds the result of one ctest run from its log
+  local log=$1 line total fails
+  line=$(grep -E "tests passed, [0-9]+ tests? failed out of [0-9]+" "$log" | tail -n1)
+  if [ -z "$line" ]; then failed=$((failed + 1)); return; fi
+  fails=$(sed -E 's/.* ([0-9]+) tests? failed out of.*/\1/' <<<"$line")
+  total=$(sed -E 's/.*out of ([0-9]+).*/\1/' <<<"$line")
+  passed=$((passed + total - fails)); failed=$((failed + fails))
+}
+
+if [ ! -d "$WINEPREFIX" ]; then
+  echo "== creating the Wine prefix"
+  wineboot -i >/dev/null 2>&1 || wine wineboot -i >/dev/null 2>&1 || true
+fi
+
+for preset in dev tsan asan mingw; do
+  echo "== $preset"
+  log=build/$preset-ctest.log
+  mkdir -p build
+  if cmake --preset "$preset" "${launcher[@]}" >build/$preset-configure.log 2>&1 \
+     && cmake --build --preset "$preset" -j2 >build/$preset-build.log 2>&1; then
+    ctest --preset "$preset" -j2 2>&1 | tee "$log"
+    count_ctest "$log"
+  else
+    echo "build of $preset failed:"; tail -n 40 build/$preset-configure.log build/$preset-build.log
+    failed=$((failed + 1))
+  fi
+done
+
+for check in scripts/checks/*.sh; do
+  [ -e "$check" ] || continue
+  echo "== $(basename "$check" .sh)"
+  if bash "$check"; then passed=$((passed + 1)); else echo "check $check failed"; failed=$((failed + 1)); fi
+done
+
+echo "$passed passed, $failed failed"
+[ "$failed" -eq 0 ]
