@@ -1,0 +1,19 @@
+#ifndef LBCORE_THREADPLATFORM_H
+#define LBCORE_THREADPLATFORM_H
+// Internal to core/: creation, forced end and release of an OS thread, one file per platform.
+#include <cstdint>
+
+namespace LbCore {
+namespace ThreadPlatform {
+
+// Starts entry(argument) on a new thread; false when no thread could be created.
+bool create(unsigned (*entry)(void*), void* argument, void*& handle, std::uint32_t& id);
+// Ends the thread by force where the platform can; false when it could not.
+bool terminate(void* handle);
+// Releases the handle of a thread that has ended (on POSIX: joins it).
+bool close(void* handle);
+
+} // namespace ThreadPlatform
+} // namespace LbCore
+
+#endif

@@ -1,0 +1,69 @@
+#include "core/Thread.h"
+
+#include "core/Log.h"
+#include "core/ThreadPlatform.h"
+
+#include <pthread.h>
+
+namespace LbCore {
+
+static CLogger s_cLogger = CLogManager::getLogger("CThread");
+
+namespace ThreadPlatform {
+
+namespace {
+struct CStart {
+    unsigned (*entry)(void*);
+    void* argument;
+};
+
+void* trampoline(void* start)
+{
+    CStart copy = *static_cast<CStart*>(start);
+    delete static_cast<CStart*>(start);
+    copy.entry(copy.argument);
+    return 0;
+}
+} // namespace
+
+bool create(unsigned (*entry)(void*), void* argument, void*& handle, std::uint32_t& id)
+{
+    CStart* start = new CStart{entry, argument};
+    pthread_t thread;
+    if (pthread_create(&thread, 0, &trampoline, start) != 0) {
+        delete start;
+        return false;
+    }
+    static_assert(sizeof(pthread_t) <= sizeof(void*), "pthread_t must fit a handle");
+    handle = reinterpret_cast<void*>(thread);
+    id = static_cast<std::uint32_t>(reinterpret_cast<std::uintptr_t>(handle));
+    return true;
+}
+
+bool terminate(void*)
+{
+    return false;
+}
+
+bool close(void* handle)
+{
+    return pthread_join(reinterpret_cast<pthread_t>(handle), 0) == 0;
+}
+
+} // namespace ThreadPlatform
+
+// POSIX has no safe forced termination, and letting the thread run on would leave it using
+// a destroyed object. So the thread is stopped cooperatively (cleanup() wakes a blocked run())
+// and waited for; this is logged at ERROR because the owner should have stopped it itself.
+bool CThread::terminate()
+{
+    if (getState() == STATE_IDLE) {
+        return false;
+    }
+    s_cLogger.error() << "LbCore::CThread::terminate" << " - " << "No forced termination on this platform; stopping the thread and waiting for its end";
+    stop();
+    m_cFinished.wait();
+    return true;
+}
+
+} // namespace LbCore
