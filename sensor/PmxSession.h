@@ -1,0 +1,119 @@
+#ifndef LBPMXVISA_PMXSESSION_H
+#define LBPMXVISA_PMXSESSION_H
+// CPmxSession: one open sensor, shared through boost::shared_ptr by every VISA session on its
+// resource. It turns written command strings into library calls and waits for the sensor's
+// acknowledgement, answers reads from its state machine (measurement result, error-queue entry
+// or operation-status value) and emulates a status byte. One command runs at a time under an
+// interlocked busy flag; a concurrent one is refused at once with CPmxSessionIsBusyException.
+// Sensor notifications arrive on the session's own event-dispatcher thread. The destructor
+// closes the sensor and leaves the dispatcher; it never throws (failures are logged at ERROR).
+#include "core/Command.h"
+#include "core/Lock.h"
+#include "core/Log.h"
+#include "core/Parent.h"
+#include "core/Queue.h"
+#include "core/Semaphore.h"
+#include "sensor/PmxCommands.h"
+#include "sensor/PmxErrorQueue.h"
+#include "sensor/PmxEventDispatcher.h"
+#include "sensor/PmxResourceInfo.h"
+
+#include <atomic>
+#include <boost/noncopyable.hpp>
+#include <cstdint>
+#include <exception>
+#include <string>
+
+namespace LbPmxVisa {
+
+class CPmxSessionDispatcher;
+class CPmxDataBuffer;
+class CIPmxSessionState;
+
+class CPmxSession : public LbCore::CParent<CPmxSessionDispatcher>,
+                    public CIPmxEventListener,
+                    public LbCore::CISerializer<LbCore::CLogMessage&, void>,
+                    private LbCore::CICommand<void(const LbCore::CICommand<void(CPmxSession&), 1>&), 0>,
+                    private boost::noncopyable {
+public:
+    typedef LbCore::CICommand<void(CPmxSession&), 1> CSessionCommand;
+
+    // A notification handed from the event thread to a waiting writer.
+    class CPmxSessionMessage : public LbCore::CMemoryPool::CMemoryPoolManaged {
+    public:
+        ~CPmxSessionMessage() override {}
+        virtual void deliver() = 0;
+    };
+
+    class CPmxSessionIsBusyException : public std::exception {
+    public:
+        const char* what() const noexcept override { return "The PMX session is currently busy with another command"; }
+    };
+
+    CPmxSession(CPmxSessionDispatcher* dispatcher, const CPmxResourceInfo& resource);
+    ~CPmxSession() override;
+
+    void open();
+    void write(const std::string& command);
+    void read(CPmxDataBuffer& buffer);
+    void readSTB(std::uint16_t* status);
+    void clear();
+
+    const CIPmxSessionState* getState() const;
+    void changeState(const CIPmxSessionState* target);
+
+    std::uint64_t getTimeout() const { return m_nTimeout; }
+    void setTimeout(std::uint64_t timeoutMs) { m_nTimeout = timeoutMs; }
+    std::uint32_t getDataFormat() const { return m_nDataFormat; }
+    std::int64_t getHandle() const { return m_lHandle; }
+    const CPmxResourceInfo& getResourceInfo() const { return m_cResourceInfo; }
+    CPmxEventDispatcher& getEventDispatcher() { return m_cEventDispatcher; }
+    CPmxErrorQueue& getErrorQueue() { return m_cErrorQueue; }
+    LbCore::CSemaphore& getDataSemaphore() { return m_cDataSemaphore; }
+
+    // The four one-byte VISA attributes; stored and reported, nothing else reads them.
+    std::uint8_t getSuppressEndEnabled() const { return m_nSuppressEndEnabled; }
+    void setSuppressEndEnabled(std::uint8_t value) { m_nSuppressEndEnabled = value; }
+    std::uint8_t getSendEndEnabled() const { return m_nSendEndEnabled; }
+    void setSendEndEnabled(std::uint8_t value) { m_nSendEndEnabled = value; }
+    std::uint8_t getTermCharEnabled() const { return m_nTermCharEnabled; }
+    void setTermCharEnabled(std::uint8_t value) { m_nTermCharEnabled = value; }
+    std::uint8_t getTermChar() const { return m_nTermChar; }
+    void setTermChar(std::uint8_t value) { m_nTermChar = value; }
+
+    // Writes "[Id: <handle>, State: <state>, Resource: <library form>]".
+    void serialize(LbCore::CLogMessage& message) const override;
+
+private:
+    void execute(const CSessionCommand& command) override;
+
+    void notifyCommandAcceptedEvent(const CPmxEvent& event) override;
+    void notifyDataAvailableEvent(const CPmxEvent& event) override;
+    void notifyErrorOccuredEvent(const CPmxEvent& event) override;
+    void notifyStateChangedEvent(const CPmxEvent& event) override;
+    void notifyDeviceChangedEvent(const CPmxEvent& event) override;
+
+    CPmxResourceInfo m_cResourceInfo;
+    CPmxEventDispatcher m_cEventDispatcher;
+    std::atomic<const CIPmxSessionState*> m_pcState;
+    std::int64_t m_lHandle;
+    std::uint64_t m_nCommandCount;
+    std::uint64_t m_nMessageCount;
+    volatile std::int32_t m_lBusy;
+    LbCore::CSemaphore m_cDataSemaphore;
+    LbCore::CQueue<CPmxSessionMessage> m_cMessageQueue;
+    CPmxErrorQueue m_cErrorQueue;
+    std::atomic<std::uint64_t> m_nTimeout;
+    std::atomic<std::uint32_t> m_nDataFormat;
+    std::atomic<std::uint8_t> m_nSuppressEndEnabled;
+    std::atomic<std::uint8_t> m_nSendEndEnabled;
+    std::atomic<std::uint8_t> m_nTermCharEnabled;
+    std::atomic<std::uint8_t> m_nTermChar;
+    // Serialises changeState between the command thread and the event thread, so a transition
+    // computed from a stale state never overwrites a newer one.
+    LbCore::CCriticalSection m_cStateLock;
+};
+
+} // namespace LbPmxVisa
+
+#endif
