@@ -49,6 +49,10 @@ int CThread::start()
         ThreadPlatform::close(m_hThread);
         m_hThread = 0;
     }
+    // That thread's end signal is left over when join() found it idle; it must not end a
+    // join() of the new thread.
+    while (m_cFinished.wait(0)) {
+    }
     void* handle = 0;
     std::uint32_t id = 0;
     if (!ThreadPlatform::create(&CThread::threadMain, this, handle, id)) {

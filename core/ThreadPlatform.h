@@ -10,7 +10,7 @@ namespace ThreadPlatform {
 bool create(unsigned (*entry)(void*), void* argument, void*& handle, std::uint32_t& id);
 // Ends the thread by force where the platform can; false when it could not.
 bool terminate(void* handle);
-// Releases the handle of a thread that has ended (on POSIX: joins it).
+// Waits for the thread to end (unless it is the calling thread) and releases its handle.
 bool close(void* handle);
 
 } // namespace ThreadPlatform

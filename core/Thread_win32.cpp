@@ -42,8 +42,13 @@ bool terminate(void* handle)
     return TerminateThread(static_cast<HANDLE>(handle), 0) != 0;
 }
 
+// Waits for the thread's very end first, as pthread_join does on POSIX: a thread that turned
+// idle may still be releasing its end signal, so its object must not go away before that.
 bool close(void* handle)
 {
+    if (GetThreadId(static_cast<HANDLE>(handle)) != GetCurrentThreadId()) {
+        WaitForSingleObject(static_cast<HANDLE>(handle), INFINITE);
+    }
     return CloseHandle(static_cast<HANDLE>(handle)) != 0;
 }
 
