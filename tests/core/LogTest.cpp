@@ -1,0 +1,204 @@
+#include "core/Log.h"
+#include "tests/core/TestSupport.h"
+
+#include <gtest/gtest.h>
+
+#include <cstdio>
+#include <ctime>
+#include <fstream>
+#include <regex>
+#include <stdexcept>
+#include <thread>
+
+using namespace LbCore;
+
+namespace {
+
+// <date> <H:MM:SS> [LEVEL] logger - text. The date follows the system locale's short form.
+const char* const kHead = R"(^[0-9]{1,4}[./-][0-9]{1,2}[./-][0-9]{1,4} ([0-9]{1,2}):[0-5][0-9]:[0-5][0-9] )";
+
+std::string tempPath(const std::string& name)
+{
+    return ::testing::TempDir() + "lbcore_" + name;
+}
+
+std::vector<std::string> readLines(const std::string& path)
+{
+    std::vector<std::string> lines;
+    std::ifstream file(path.c_str());
+    for (std::string line; std::getline(file, line);) {
+        lines.push_back(line);
+    }
+    return lines;
+}
+
+int localHour()
+{
+    std::time_t now = std::time(0);
+    return std::localtime(&now)->tm_hour;
+}
+
+class CSelfWriter : public CLogMessage::CSerializer {
+public:
+    void serialize(CLogMessage& message) const override { message << "session 0x0003::" << 100000; }
+};
+
+class CLogTest : public ::testing::Test {
+protected:
+    CLogTest() : m_cLogger(CLogManager::getLogger("CTestLogger")) { CLogManager::setLevel(LEVEL_DEBUG); }
+    LbTests::CCaptureAppender m_cCapture; // restores the threshold and detaches itself
+    CLogger m_cLogger;
+};
+
+} // namespace
+
+TEST_F(CLogTest, LineCarriesDateTimeLevelLoggerAndPieces)
+{
+    int before = localHour();
+    m_cLogger.warn() << "LbCore::CTest::op" << " - " << "value " << 42 << ' ' << 7u << ' ' << 18446744073709551615ull;
+    int after = localHour();
+    std::vector<std::string> lines = m_cCapture.lines();
+    ASSERT_EQ(1u, lines.size());
+    std::smatch match;
+    std::regex line(std::string(kHead) + R"(\[WARN \] CTestLogger - LbCore::CTest::op - value 42 7 18446744073709551615$)");
+    ASSERT_TRUE(std::regex_search(lines[0], match, line)) << lines[0];
+    int hour = std::stoi(match[1].str()); // a 24-hour clock: the hour is the local tm_hour
+    EXPECT_TRUE(hour == before || hour == after) << lines[0];
+}
+
+TEST_F(CLogTest, LevelTextIsAlwaysFiveCharacters)
+{
+    m_cLogger.debug() << "d";
+    m_cLogger.info() << "i";
+    m_cLogger.warn() << "w";
+    m_cLogger.error() << "e";
+    m_cLogger.fatal() << "f";
+    const char* expected[] = {"[DEBUG] CTestLogger - d", "[INFO ] CTestLogger - i", "[WARN ] CTestLogger - w",
+                              "[ERROR] CTestLogger - e", "[FATAL] CTestLogger - f"};
+    std::vector<std::string> lines = m_cCapture.lines();
+    ASSERT_EQ(5u, lines.size());
+    for (int i = 0; i < 5; ++i) {
+        EXPECT_TRUE(std::regex_search(lines[i], std::regex(std::string(kHead) + "\\" + expected[i] + "$"))) << lines[i];
+    }
+}
+
+TEST_F(CLogTest, ThresholdFiltersMessagesAndInsertions)
+{
+    CLogManager::setLevel(LEVEL_WARN);
+    {
+        CLogMessage info = m_cLogger.info();
+        info << "ignored" << 1;
+        EXPECT_FALSE(info.isEnabled());
+        EXPECT_EQ("", info.getText()); // no head, no text
+    }
+    m_cLogger.warn() << "w";
+    m_cLogger.error() << "e";
+    m_cLogger.fatal() << "f";
+    {
+        CLogMessage late = m_cLogger.warn();
+        late << "raised before emission";
+        CLogManager::setLevel(LEVEL_ERROR); // the threshold is read again at emission
+    }
+    std::vector<std::string> lines = m_cCapture.lines();
+    ASSERT_EQ(3u, lines.size());
+    EXPECT_NE(std::string::npos, lines[0].find("[WARN ] CTestLogger - w"));
+    EXPECT_NE(std::string::npos, lines[1].find("[ERROR] CTestLogger - e"));
+    EXPECT_NE(std::string::npos, lines[2].find("[FATAL] CTestLogger - f"));
+}
+
+TEST_F(CLogTest, StreamsExceptionsAndSelfWritingObjects)
+{
+    CSelfWriter writer;
+    m_cLogger.error() << std::runtime_error("boom") << " / " << &writer;
+    ASSERT_EQ(1u, m_cCapture.lines().size());
+    EXPECT_NE(std::string::npos, m_cCapture.lines()[0].find("CTestLogger - boom / session 0x0003::100000"));
+}
+
+TEST_F(CLogTest, AttachRefusesDuplicatesAndEmptyManagerAppendsNothing)
+{
+    EXPECT_FALSE(CLogManager::attach(m_cCapture));
+    EXPECT_TRUE(CLogManager::detach(m_cCapture));
+    EXPECT_FALSE(CLogManager::detach(m_cCapture));
+    {
+        CLogMessage message = m_cLogger.info();
+        message << "nobody listens";
+        EXPECT_FALSE(CLogManager::getInstance().append(message));
+    }
+    EXPECT_TRUE(m_cCapture.lines().empty());
+    EXPECT_TRUE(CLogManager::attach(m_cCapture));
+}
+
+TEST_F(CLogTest, MissingParentsThrow)
+{
+    CLogger orphan(0, "COrphan");
+    EXPECT_THROW(orphan.info(), std::runtime_error);
+    try {
+        CLogMessage message(0, LEVEL_ERROR);
+        FAIL() << "a message without logger was built";
+    } catch (const std::runtime_error& e) {
+        EXPECT_STREQ("NULL pointer m_pcParent", e.what());
+    }
+}
+
+TEST_F(CLogTest, FileAppenderAppendsToExistingContent)
+{
+    const std::string path = tempPath("append.log");
+    std::remove(path.c_str());
+    {
+        std::ofstream earlier(path.c_str());
+        earlier << "line of an earlier run\n";
+    }
+    for (const char* text : {"first", "second"}) {
+        CLogFileAppender appender(path);
+        EXPECT_TRUE(appender.isOpen());
+        m_cLogger.info() << text;
+    }
+    m_cLogger.info() << "after the appender is gone";
+    std::vector<std::string> lines = readLines(path);
+    ASSERT_EQ(3u, lines.size());
+    EXPECT_EQ("line of an earlier run", lines[0]);
+    EXPECT_TRUE(std::regex_search(lines[1], std::regex(std::string(kHead) + R"(\[INFO \] CTestLogger - first$)"))) << lines[1];
+    EXPECT_TRUE(std::regex_search(lines[2], std::regex(std::string(kHead) + R"(\[INFO \] CTestLogger - second$)"))) << lines[2];
+    std::remove(path.c_str());
+}
+
+TEST_F(CLogTest, FileAppenderInAMissingDirectoryStaysSilent)
+{
+    const std::string path = tempPath("no_such_dir/sub/x.log");
+    CLogFileAppender appender(path);
+    EXPECT_FALSE(appender.isOpen());
+    EXPECT_FALSE(CLogManager::detach(appender)); // it never attached
+    m_cLogger.error() << "still fine";
+    EXPECT_EQ(1u, m_cCapture.lines().size());
+    EXPECT_FALSE(std::ifstream(path.c_str()).is_open());
+}
+
+TEST_F(CLogTest, TwoThreadsWriteWholeLines)
+{
+    const std::string path = tempPath("threads.log");
+    std::remove(path.c_str());
+    const int kLines = 200;
+    {
+        CLogFileAppender appender(path);
+        ASSERT_TRUE(appender.isOpen());
+        auto writer = [this](const char* name) {
+            CLogger logger = CLogManager::getLogger(name);
+            for (int i = 0; i < kLines; ++i) {
+                logger.info() << "LbCore::CTest::write" << " - " << "line " << i << " of " << name;
+            }
+        };
+        std::thread a(writer, "CWriterA");
+        std::thread b(writer, "CWriterB");
+        a.join();
+        b.join();
+    }
+    std::vector<std::string> lines = readLines(path);
+    ASSERT_EQ(2u * kLines, lines.size());
+    std::regex whole(std::string(kHead) + R"(\[INFO \] (CWriter[AB]) - LbCore::CTest::write - line [0-9]+ of (CWriter[AB])$)");
+    for (const std::string& line : lines) {
+        std::smatch match;
+        ASSERT_TRUE(std::regex_search(line, match, whole)) << line;
+        EXPECT_EQ(match[2].str(), match[3].str()) << line;
+    }
+    std::remove(path.c_str());
+}

@@ -1,0 +1,72 @@
+#include "core/MemoryPool.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <mutex>
+#include <sstream>
+#include <thread>
+#include <vector>
+
+using namespace LbCore;
+
+namespace {
+
+std::atomic<int> g_nAlive(0);
+
+class CManaged : public CMemoryPool::CMemoryPoolManaged {
+public:
+    explicit CManaged(int value) : m_nValue(value), m_aPayload() { ++g_nAlive; }
+    ~CManaged() override { --g_nAlive; }
+    int m_nValue;
+    char m_aPayload[40];
+};
+
+} // namespace
+
+// Objects are made on one thread and freed on another, in no particular order.
+TEST(CMemoryPoolTest, ManagedObjectsComeAndGoFromSeveralThreads)
+{
+    const int kThreads = 4;
+    const int kObjects = 500;
+    std::mutex mutex;
+    std::vector<CManaged*> shared;
+    std::vector<std::thread> threads;
+    for (int t = 0; t < kThreads; ++t) {
+        threads.emplace_back([&, t] {
+            for (int i = 0; i < kObjects; ++i) {
+                CManaged* made = (i % 3 == 0) ? new (std::nothrow) CManaged(t) : new CManaged(t);
+                ASSERT_NE(nullptr, made);
+                CManaged* old = 0;
+                {
+                    std::lock_guard<std::mutex> lock(mutex);
+                    shared.push_back(made);
+                    if (i % 2 == 1) {
+                        old = shared.front();
+                        shared.erase(shared.begin());
+                    }
+                }
+                delete old;
+            }
+        });
+    }
+    for (std::thread& thread : threads) {
+        thread.join();
+    }
+    EXPECT_EQ(static_cast<int>(shared.size()), g_nAlive.load());
+    for (CManaged* managed : shared) {
+        delete managed;
+    }
+    EXPECT_EQ(0, g_nAlive.load());
+}
+
+TEST(CMemoryPoolTest, PoolIsOneInstanceAndReportsNothing)
+{
+    EXPECT_EQ(&CMemoryPool::getInstance(), &CMemoryPool::getInstance());
+    void* block = CMemoryPool::getInstance().allocate(0);
+    EXPECT_NE(nullptr, block);
+    CMemoryPool::getInstance().free(block);
+    std::ostringstream report;
+    CMemoryPool::getInstance().report(report);
+    EXPECT_EQ("", report.str());
+}
