@@ -35,6 +35,7 @@ public:
     CPmxDataBuffer& operator=(const CPmxDataBuffer& other);
     ~CPmxDataBuffer() override {}
 
+    // Raw writes take the length in bytes.
     void write(const std::string& text);
     void write(unsigned char (*source)[1024], unsigned length);
     void write(float* source, unsigned length);
@@ -45,7 +46,7 @@ public:
     char* getPosition() const { return m_pcPosition; }
     std::uint32_t getCount() const { return *m_pnCount; }
     std::size_t getCapacity() const { return m_nCapacity; }
-    std::size_t getRoom() const { return m_nCapacity - *m_pnCount; }
+    std::size_t getRoom() const;
 
 private:
     void writeRaw(const void* source, unsigned length);
