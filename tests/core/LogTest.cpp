@@ -14,8 +14,11 @@ using namespace LbCore;
 
 namespace {
 
-// <date> <H:MM:SS> [LEVEL] logger - text. The date follows the system locale's short form.
-const char* const kHead = R"(^[0-9]{1,4}[./-][0-9]{1,2}[./-][0-9]{1,4} ([0-9]{1,2}):[0-5][0-9]:[0-5][0-9] )";
+// <date> <H:MM:SS> [LEVEL] logger - text. The date follows the system locale's short form; a
+// locale whose time picture has a marker (en-US "h:mm:ss tt") keeps it after the forced
+// 24-hour time on Windows, e.g. "19:12:53 PM".
+const char* const kHead =
+    R"(^[0-9]{1,4}[./-][0-9]{1,2}[./-][0-9]{1,4} ([0-9]{1,2}):[0-5][0-9]:[0-5][0-9](?: [AP]M)? )";
 
 std::string tempPath(const std::string& name)
 {
