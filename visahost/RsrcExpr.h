@@ -1,0 +1,54 @@
+// Resource expressions of viFindRsrc: a VISA regular expression over the resource string,
+// optionally followed by an attribute expression in braces, e.g. "?*::INSTR{VI_ATTR_MANF_ID==0x3F}".
+//
+// Regular expression: ? any one character, * / + zero / one or more of what precedes,
+// [list] and [^list] character sets, a|b alternatives, (..) groups, \c a literal c; matching
+// covers the whole string and ignores case. Attribute expression: conditions
+// "ATTRIBUTE op value" (op ==, !=, <, >, <=, >=; value a number or a quoted string that is a
+// regular expression for == and !=) joined by &&, ||, ! and parentheses.
+// Every constructor throws CRsrcExpr::CInvalidExpression on bad syntax.
+#pragma once
+
+#include <functional>
+#include <memory>
+#include <regex>
+#include <stdexcept>
+#include <string>
+
+#include "visahost/include/visa.h"
+
+namespace LbVisaHost {
+
+// One condition of an attribute expression.
+struct SAttrCondition {
+  ViAttr m_nAttr = 0;
+  ViUInt16 m_nOp = 0;  // LBVISA_OP_*
+  bool m_bText = false;
+  ViAttrState m_nValue = 0;
+  std::string m_strText;
+};
+
+class CRsrcExpr {
+ public:
+  class CInvalidExpression : public std::runtime_error {
+   public:
+    using std::runtime_error::runtime_error;
+  };
+  // Answers whether the resource satisfies one condition.
+  using FCondition = std::function<bool(const SAttrCondition &)>;
+
+  explicit CRsrcExpr(const std::string &strExpr);
+  bool matches(const std::string &strRsrc) const;
+  bool hasAttributes() const { return !m_strAttributes.empty(); }
+  // Evaluates the attribute expression (true when there is none).
+  bool matchesAttributes(const FCondition &fCondition) const;
+
+  // A VISA regular expression as an ECMAScript one; throws CInvalidExpression.
+  static std::regex compile(const std::string &strVisaRegex);
+
+ private:
+  std::regex m_cRegex;
+  std::string m_strAttributes;
+};
+
+}  // namespace LbVisaHost

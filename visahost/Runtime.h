@@ -1,0 +1,165 @@
+// CRuntime: the state of the VISA runtime stand-in, one per process, shared by the service
+// library's services and the VISA C API.
+//
+// Contract:
+// - Handles (resource managers, sessions, find lists, event contexts) are never reused, so a
+//   closed handle answers VI_ERROR_INV_OBJECT for the life of the process.
+// - Passports are loaded on the first viOpenDefaultRM; their entry runs during the load and
+//   may call every service. Vector tables are routing targets in the order they were created.
+// - Calls into passports and event handlers are made without holding the runtime's mutex, so
+//   passports may call services (and handlers VISA operations) from within them.
+// - viClose of a session waits until calls on it from other threads have returned, so a
+//   passport never sees an operation on a session it has already closed.
+// - The object lives until the process ends (it is never destroyed), so passports may call
+//   services from their unload code.
+#pragma once
+
+#include <condition_variable>
+#include <cstdint>
+#include <deque>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <set>
+#include <string>
+#include <vector>
+
+#include "visahost/Services.h"
+
+namespace LbVisaHost {
+
+class CRuntime {
+ public:
+  static CRuntime &instance();
+  CRuntime(const CRuntime &) = delete;
+  CRuntime &operator=(const CRuntime &) = delete;
+
+  // Services (see Services.h and README.md).
+  ViStatus createLock(ViConstString szName, ViSvcHandle *phLock);
+  ViStatus acquireLock(ViSvcHandle hLock, ViUInt32 nTimeout);
+  ViStatus releaseLock(ViSvcHandle hLock);
+  ViStatus createTable(ViConstString szName, ViVersion nVersion, ViSvcHandle *phTable);
+  ViStatus addOperation(ViSvcHandle hTable, ViConstString szOperation, ViSvcProc pfEntry);
+  ViStatus matchRsrc(ViSession nRm, ViConstString szExpr, ViConstString szRsrc, ViUInt16 *pnFlag);
+  ViStatus matchAttributes(ViSession nRm, ViConstString szExpr, ViConstString szRsrc,
+                           ViSvcFindCallback pfCallback);
+  ViStatus appendFound(ViFindList nList, ViConstString szRsrc);
+  ViStatus declareEvents(ViSession nVi, ViUInt32 nCount, const ViEventType *pnTypes);
+  ViStatus createEvent(ViSession nVi, ViEventType nType, ViEvent *pnContext, ViUInt32 *pnMech);
+  ViStatus raiseEvent(ViSession nVi, ViEvent nContext, ViUInt32 nMech);
+  ViStatus installTable(ViSession nVi, ViSvcHandle hTable);
+  ViAddr *sessionRecord(ViSession nVi);
+  ViStatus detach();
+
+  // VISA C API.
+  ViStatus openDefaultRM(ViPSession pnVi);
+  ViStatus findRsrc(ViSession nRm, ViConstString szExpr, ViPFindList pnList, ViPUInt32 pnCount,
+                    ViChar szDesc[]);
+  ViStatus findNext(ViFindList nList, ViChar szDesc[]);
+  ViStatus parseRsrc(ViSession nRm, ViConstRsrc szName, ViPUInt16 pnType, ViPUInt16 pnNum,
+                     ViChar szClass[], ViChar szExpanded[], ViChar szAlias[], bool bExtended);
+  ViStatus open(ViSession nRm, ViConstRsrc szName, ViAccessMode nMode, ViUInt32 nTimeout,
+                ViPSession pnVi);
+  ViStatus close(ViObject nVi);
+  ViStatus read(ViSession nVi, ViPBuf pBuf, ViUInt32 nCount, ViPUInt32 pnRet);
+  ViStatus write(ViSession nVi, ViConstBuf pBuf, ViUInt32 nCount, ViPUInt32 pnRet);
+  ViStatus readSTB(ViSession nVi, ViPUInt16 pnStatus);
+  ViStatus clear(ViSession nVi);
+  ViStatus assertTrigger(ViSession nVi, ViUInt16 nProtocol);
+  ViStatus terminate(ViObject nVi, ViUInt16 nDegree, ViJobId nJob);
+  ViStatus getAttribute(ViObject nVi, ViAttr nAttr, void *pValue);
+  ViStatus setAttribute(ViObject nVi, ViAttr nAttr, ViAttrState nValue);
+  ViStatus enableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech, ViEventFilter nContext);
+  ViStatus disableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech);
+  ViStatus discardEvents(ViSession nVi, ViEventType nType, ViUInt16 nMech);
+  ViStatus waitOnEvent(ViSession nVi, ViEventType nType, ViUInt32 nTimeout, ViPEventType pnOutType,
+                       ViPEvent pnOutContext);
+  ViStatus installHandler(ViSession nVi, ViEventType nType, ViHndlr pfHandler, ViAddr pUser);
+  ViStatus uninstallHandler(ViSession nVi, ViEventType nType, ViHndlr pfHandler, ViAddr pUser);
+  ViStatus statusDesc(ViObject nVi, ViStatus nStatus, ViChar szDesc[]);
+  ViStatus lock(ViSession nVi, ViAccessMode nType, ViUInt32 nTimeout, ViConstKeyId szRequested,
+                ViChar szAccessKey[]);
+  ViStatus unlock(ViSession nVi);
+
+ private:
+  enum class EKind { ResourceManager, Session, FindList, Event };
+  struct CTable {
+    std::string m_strName;
+    std::map<std::string, ViSvcProc> m_mapOps;
+  };
+  struct CSvcLock {
+    std::mutex m_aMutex;
+    std::condition_variable m_cvFree;
+    const void *m_pOwner = nullptr;  // identity of the owning thread
+    unsigned m_nDepth = 0;
+  };
+  struct SHandler {
+    ViEventType m_nType;
+    ViHndlr m_pfHandler;
+    ViAddr m_pUser;
+  };
+  struct CObject {
+    // Record handed to the passport by service 57; [2] is the passport's slot.
+    ViAddr m_apRecord[3] = {};
+    EKind m_eKind;
+    ViObject m_nHandle = 0;
+    ViSession m_nRm = 0;  // owning resource manager of sessions and find lists
+    CTable *m_pcTable = nullptr;
+    std::string m_strRsrc;
+    ViAttrState m_nUserData = 0;
+    bool m_bClosing = false;
+    unsigned m_nCalls = 0;  // calls in progress through the vector table
+    std::set<ViEventType> m_setDeclared;
+    std::map<ViEventType, ViUInt16> m_mapEnabled;
+    std::deque<ViEvent> m_dqQueue;
+    ViUInt32 m_nMaxQueue = 50;
+    std::vector<SHandler> m_vHandlers;
+    std::condition_variable m_cvChanged;  // queue changed, a call returned, or closing
+    std::vector<std::string> m_vFound;
+    size_t m_nNext = 0;
+    ViEventType m_nEventType = 0;  // event contexts: type and session
+    ViSession m_nSource = 0;
+  };
+  using PObject = std::shared_ptr<CObject>;
+  struct SRsrcLock {
+    ViSession m_nExclusive = 0;
+    unsigned m_nExclusiveDepth = 0;
+    std::string m_strSharedKey;
+    std::map<ViSession, unsigned> m_mapShared;
+  };
+
+  CRuntime() = default;
+  void loadPassports();
+  PObject find(ViObject nHandle) const;  // caller holds m_aMutex
+  PObject add(EKind eKind, ViSession nRm, const std::string &strRsrc);
+  void erase(ViObject nHandle);  // caller holds m_aMutex
+  std::vector<CTable *> tablesWith(const char *szOperation);
+  ViStatus closeSession(const PObject &pcSession);
+  bool accessAllowed(const CObject &cSession) const;  // caller holds m_aMutex
+  bool eventTypeKnown(const CObject &cSession, ViEventType nType) const;
+  ViStatus runtimeAttribute(const PObject &pcObject, ViAttr nAttr, void *pValue, bool &bDone);
+  void closeEvent(ViEvent nContext);  // caller holds m_aMutex
+
+  // Calls operation szOp of the vector table installed on session nVi; VI_ERROR_NSUP_OPER
+  // when the table lacks it, VI_ERROR_RSRC_LOCKED when another session locked the resource.
+  template <typename F, typename... A>
+  ViStatus route(ViSession nVi, const char *szOp, bool bNeedsAccess, A... args);
+
+  std::mutex m_aLoadMutex;
+  bool m_bLoaded = false;
+
+  mutable std::mutex m_aMutex;
+  std::condition_variable m_cvLocks;  // a resource lock was released
+  std::map<ViObject, PObject> m_mapObjects;
+  ViObject m_nNextHandle = 0x10000;
+  std::vector<std::unique_ptr<CTable>> m_vTables;
+  std::map<std::string, std::unique_ptr<CSvcLock>> m_mapLocks;
+  std::map<std::string, SRsrcLock> m_mapRsrcLocks;
+  unsigned m_nKeys = 0;
+  unsigned m_nDetaches = 0;
+};
+
+// Text for a status; false when the status is unknown.
+bool statusText(ViStatus nStatus, std::string &strText);
+
+}  // namespace LbVisaHost

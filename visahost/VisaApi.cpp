@@ -1,0 +1,85 @@
+// The VISA C API library: every operation goes to the runtime in the service library.
+#include "visahost/Services.h"
+
+namespace {
+const LbVisaHostApi &api() {
+  static const LbVisaHostApi *s_psApi = lbVisaHostApi();
+  return *s_psApi;
+}
+}  // namespace
+
+extern "C" {
+
+ViStatus _VI_FUNC viOpenDefaultRM(ViPSession vi) { return api().openDefaultRM(vi); }
+ViStatus _VI_FUNC viFindRsrc(ViSession sesn, ViConstString expr, ViPFindList vi, ViPUInt32 retCnt,
+                             ViChar desc[]) {
+  return api().findRsrc(sesn, expr, vi, retCnt, desc);
+}
+ViStatus _VI_FUNC viFindNext(ViFindList vi, ViChar desc[]) { return api().findNext(vi, desc); }
+ViStatus _VI_FUNC viParseRsrc(ViSession rmSesn, ViConstRsrc rsrcName, ViPUInt16 intfType,
+                              ViPUInt16 intfNum) {
+  return api().parseRsrc(rmSesn, rsrcName, intfType, intfNum);
+}
+ViStatus _VI_FUNC viParseRsrcEx(ViSession rmSesn, ViConstRsrc rsrcName, ViPUInt16 intfType,
+                                ViPUInt16 intfNum, ViChar rsrcClass[],
+                                ViChar expandedUnaliasedName[], ViChar aliasIfExists[]) {
+  return api().parseRsrcEx(rmSesn, rsrcName, intfType, intfNum, rsrcClass, expandedUnaliasedName,
+                           aliasIfExists);
+}
+ViStatus _VI_FUNC viOpen(ViSession sesn, ViConstRsrc name, ViAccessMode mode, ViUInt32 timeout,
+                         ViPSession vi) {
+  return api().open(sesn, name, mode, timeout, vi);
+}
+ViStatus _VI_FUNC viClose(ViObject vi) { return api().close(vi); }
+ViStatus _VI_FUNC viSetAttribute(ViObject vi, ViAttr attrName, ViAttrState attrValue) {
+  return api().setAttribute(vi, attrName, attrValue);
+}
+ViStatus _VI_FUNC viGetAttribute(ViObject vi, ViAttr attrName, void *attrValue) {
+  return api().getAttribute(vi, attrName, attrValue);
+}
+ViStatus _VI_FUNC viStatusDesc(ViObject vi, ViStatus status, ViChar desc[]) {
+  return api().statusDesc(vi, status, desc);
+}
+ViStatus _VI_FUNC viTerminate(ViObject vi, ViUInt16 degree, ViJobId jobId) {
+  return api().terminate(vi, degree, jobId);
+}
+ViStatus _VI_FUNC viLock(ViSession vi, ViAccessMode lockType, ViUInt32 timeout,
+                         ViConstKeyId requestedKey, ViChar accessKey[]) {
+  return api().lock(vi, lockType, timeout, requestedKey, accessKey);
+}
+ViStatus _VI_FUNC viUnlock(ViSession vi) { return api().unlock(vi); }
+ViStatus _VI_FUNC viEnableEvent(ViSession vi, ViEventType eventType, ViUInt16 mechanism,
+                                ViEventFilter context) {
+  return api().enableEvent(vi, eventType, mechanism, context);
+}
+ViStatus _VI_FUNC viDisableEvent(ViSession vi, ViEventType eventType, ViUInt16 mechanism) {
+  return api().disableEvent(vi, eventType, mechanism);
+}
+ViStatus _VI_FUNC viDiscardEvents(ViSession vi, ViEventType eventType, ViUInt16 mechanism) {
+  return api().discardEvents(vi, eventType, mechanism);
+}
+ViStatus _VI_FUNC viWaitOnEvent(ViSession vi, ViEventType inEventType, ViUInt32 timeout,
+                                ViPEventType outEventType, ViPEvent outContext) {
+  return api().waitOnEvent(vi, inEventType, timeout, outEventType, outContext);
+}
+ViStatus _VI_FUNC viInstallHandler(ViSession vi, ViEventType eventType, ViHndlr handler,
+                                   ViAddr userHandle) {
+  return api().installHandler(vi, eventType, handler, userHandle);
+}
+ViStatus _VI_FUNC viUninstallHandler(ViSession vi, ViEventType eventType, ViHndlr handler,
+                                     ViAddr userHandle) {
+  return api().uninstallHandler(vi, eventType, handler, userHandle);
+}
+ViStatus _VI_FUNC viRead(ViSession vi, ViPBuf buf, ViUInt32 cnt, ViPUInt32 retCnt) {
+  return api().read(vi, buf, cnt, retCnt);
+}
+ViStatus _VI_FUNC viWrite(ViSession vi, ViConstBuf buf, ViUInt32 cnt, ViPUInt32 retCnt) {
+  return api().write(vi, buf, cnt, retCnt);
+}
+ViStatus _VI_FUNC viAssertTrigger(ViSession vi, ViUInt16 protocol) {
+  return api().assertTrigger(vi, protocol);
+}
+ViStatus _VI_FUNC viReadSTB(ViSession vi, ViPUInt16 status) { return api().readSTB(vi, status); }
+ViStatus _VI_FUNC viClear(ViSession vi) { return api().clear(vi); }
+
+}  // extern "C"
