@@ -66,6 +66,9 @@ public:
     void setTimeout(std::uint64_t timeoutMs) { m_nTimeout = timeoutMs; }
     std::uint32_t getDataFormat() const { return m_nDataFormat; }
     std::int64_t getHandle() const { return m_lHandle; }
+    // Commands sent to the sensor and answers accounted for; equal while nothing is pending.
+    std::uint64_t getCommandCount() const { return m_nCommandCount; }
+    std::uint64_t getMessageCount() const { return m_nMessageCount; }
     const CPmxResourceInfo& getResourceInfo() const { return m_cResourceInfo; }
     CPmxEventDispatcher& getEventDispatcher() { return m_cEventDispatcher; }
     CPmxErrorQueue& getErrorQueue() { return m_cErrorQueue; }
@@ -94,9 +97,11 @@ private:
     void notifyDeviceChangedEvent(const CPmxEvent& event) override;
 
     CPmxResourceInfo m_cResourceInfo;
-    CPmxEventDispatcher m_cEventDispatcher;
+    // State and handle come before the event dispatcher because its construction may already
+    // describe the session in a log line.
     std::atomic<const CIPmxSessionState*> m_pcState;
     std::int64_t m_lHandle;
+    CPmxEventDispatcher m_cEventDispatcher;
     std::uint64_t m_nCommandCount;
     std::uint64_t m_nMessageCount;
     volatile std::int32_t m_lBusy;
@@ -110,8 +115,10 @@ private:
     std::atomic<std::uint8_t> m_nTermCharEnabled;
     std::atomic<std::uint8_t> m_nTermChar;
     // Serialises changeState between the command thread and the event thread, so a transition
-    // computed from a stale state never overwrites a newer one.
-    LbCore::CCriticalSection m_cStateLock;
+    // computed from a stale state never overwrites a newer one. getState takes it too: a
+    // transition may release the data semaphore before the new state is stored, and the woken
+    // reader must see the stored state.
+    mutable LbCore::CCriticalSection m_cStateLock;
 };
 
 } // namespace LbPmxVisa

@@ -1,0 +1,66 @@
+#include "sensor/PmxErrorQueue.h"
+
+#include "core/Log.h"
+#include "sensor/PmxDataBuffer.h"
+#include "sensor/PmxSession.h"
+#include "sensor/PmxSessionDispatcher.h"
+
+#include <sstream>
+
+namespace LbPmxVisa {
+
+static LbCore::CLogger s_cLogger = LbCore::CLogManager::getLogger("CPmxErrorQueue");
+
+CPmxErrorQueue::CPmxErrorQueue(CPmxSession* session) : LbCore::CParent<CPmxSession>(session)
+{
+    getParent()->getEventDispatcher().addListener(this);
+}
+
+// The session stops its event thread before its error queue goes, so no delivery can still be
+// running here.
+CPmxErrorQueue::~CPmxErrorQueue() {}
+
+void CPmxErrorQueue::serialize(CPmxDataBuffer& buffer) const
+{
+    std::pair<std::int32_t, std::string> entry(0, "No Error");
+    {
+        LbCore::CLock<LbCore::CCriticalSection> lock(m_cLock);
+        if (!m_cEntries.empty()) {
+            entry = m_cEntries.back();
+            m_cEntries.pop_back();
+        }
+    }
+    std::ostringstream text;
+    text << entry.first << ", \"" << entry.second << "\"";
+    buffer.write(text.str());
+}
+
+bool CPmxErrorQueue::isEmpty() const
+{
+    LbCore::CLock<LbCore::CCriticalSection> lock(m_cLock);
+    return m_cEntries.empty();
+}
+
+void CPmxErrorQueue::notifyCommandAcceptedEvent(const CPmxEvent&) {}
+
+void CPmxErrorQueue::notifyDataAvailableEvent(const CPmxEvent&) {}
+
+void CPmxErrorQueue::notifyErrorOccuredEvent(const CPmxEvent& event)
+{
+    std::int32_t code = event.value;
+    CPmxSession* session = getParent();
+    CPmxSessionDispatcher* dispatcher = session->getParent();
+    char text[1024] = {0};
+    dispatcher->getCommands()->getErrorText(code, text, sizeof(text));
+    text[sizeof(text) - 1] = 0; // a library that fills the whole buffer still yields a terminated text
+    s_cLogger.error() << "LbPmxVisa::CPmxErrorQueue::notifyErrorOccuredEvent" << " - "
+                      << "An Pmx-Error has been occurred on session " << session << " [Error: " << text << "]";
+    LbCore::CLock<LbCore::CCriticalSection> lock(m_cLock);
+    m_cEntries.push_back(std::make_pair(code, std::string(text)));
+}
+
+void CPmxErrorQueue::notifyStateChangedEvent(const CPmxEvent&) {}
+
+void CPmxErrorQueue::notifyDeviceChangedEvent(const CPmxEvent&) {}
+
+} // namespace LbPmxVisa

@@ -1,0 +1,363 @@
+#include "sensor/PmxSession.h"
+
+#include "core/Interlocked.h"
+#include "sensor/PmxDataBuffer.h"
+#include "sensor/PmxScpiCommandParser.h"
+#include "sensor/PmxSessionDispatcher.h"
+#include "sensor/PmxSessionState.h"
+
+#include <boost/tokenizer.hpp>
+#include <cctype>
+#include <memory>
+#include <stdexcept>
+
+namespace LbPmxVisa {
+
+static LbCore::CLogger s_cLogger = LbCore::CLogManager::getLogger("CPmxSession");
+
+namespace {
+
+typedef LbCore::CQueue<CPmxSession::CPmxSessionMessage> CMessageQueue;
+
+// Throws away every message no writer has taken, without delivering it.
+void clearMessages(CMessageQueue& queue)
+{
+    CPmxSession::CPmxSessionMessage* message = 0;
+    int result;
+    while ((result = queue.pop(message, 0)) != CMessageQueue::RESULT_TIMEOUT) {
+        if (result == CMessageQueue::RESULT_ITEM) {
+            delete message;
+        }
+    }
+}
+
+// The VISA time-out is unsigned 64-bit; waits take 32 bits, where 0xFFFFFFFF means no limit.
+unsigned toWait(std::uint64_t timeoutMs)
+{
+    return timeoutMs >= LbCore::CSemaphore::INFINITE_WAIT ? LbCore::CSemaphore::INFINITE_WAIT
+                                                          : static_cast<unsigned>(timeoutMs);
+}
+
+} // namespace
+
+// The attribute fields start at the usual VISA defaults: END suppression off, END sent with
+// the last byte, termination character line feed, not enabled.
+CPmxSession::CPmxSession(CPmxSessionDispatcher* dispatcher, const CPmxResourceInfo& resource)
+    : LbCore::CParent<CPmxSessionDispatcher>(dispatcher), m_cResourceInfo(resource),
+      m_pcState(CIPmxSessionState::noData()), m_lHandle(0), m_cEventDispatcher(this), m_nCommandCount(0),
+      m_nMessageCount(0), m_lBusy(0), m_cDataSemaphore(0), m_cMessageQueue(10), m_cErrorQueue(this), m_nTimeout(5000),
+      m_nDataFormat(0), m_nSuppressEndEnabled(0), m_nSendEndEnabled(1), m_nTermCharEnabled(0), m_nTermChar('\n')
+{
+}
+
+// Never throws: the session is released from destructors and cleanup paths of its users. A
+// failure to close is logged and the session leaves the dispatcher all the same.
+CPmxSession::~CPmxSession()
+{
+    if (m_lHandle != 0) {
+        try {
+            s_cLogger.info() << "LbPmxVisa::CPmxSession::~CPmxSession" << " - " << "Closing session " << this;
+            getParent()->callChecked(&CIPmxCommands::closeSensor, *this);
+            s_cLogger.info() << "LbPmxVisa::CPmxSession::~CPmxSession" << " - " << "Session closed successfully";
+        } catch (const std::exception& e) {
+            s_cLogger.error() << "LbPmxVisa::CPmxSession::~CPmxSession" << " - " << "Closing session " << this
+                              << " failed: " << e.what();
+        }
+        m_cMessageQueue.interrupt();
+        try {
+            getParent()->detach(*this);
+        } catch (const std::exception& e) {
+            s_cLogger.error() << "LbPmxVisa::CPmxSession::~CPmxSession" << " - " << "Leaving the dispatcher failed for session "
+                              << this << ": " << e.what();
+        }
+    } else {
+        try {
+            getParent()->closeDriverIfIdle();
+        } catch (const std::exception& e) {
+            s_cLogger.error() << "LbPmxVisa::CPmxSession::~CPmxSession" << " - " << "Closing the driver failed: " << e.what();
+        }
+    }
+    // The event thread uses the error queue, the message queue and the data semaphore, which
+    // are destroyed before the event dispatcher: it must end first.
+    m_cEventDispatcher.shutdown();
+}
+
+void CPmxSession::open()
+{
+    s_cLogger.info() << "LbPmxVisa::CPmxSession::open" << " - " << "Open session";
+    getParent()->callChecked(&CIPmxCommands::openSensor, m_cResourceInfo, &m_lHandle);
+    s_cLogger.info() << "LbPmxVisa::CPmxSession::open" << " - " << "Session opened successfully: " << this;
+    getParent()->registerSession(*this);
+    m_cEventDispatcher.addListener(this);
+}
+
+void CPmxSession::execute(const CSessionCommand& command)
+{
+    if (LbCore::interlockedCompareExchange(&m_lBusy, 1, 0) != 0) {
+        throw CPmxSessionIsBusyException();
+    }
+    s_cLogger.debug() << "LbPmxVisa::CPmxSession::execute" << " - " << "Executing command for session " << this;
+    try {
+        // Commands are handed over as constant references but are ordinary objects.
+        const_cast<CSessionCommand&>(command).execute(*this);
+    } catch (...) {
+        if (LbCore::interlockedCompareExchange(&m_lBusy, 0, 1) != 1) {
+            s_cLogger.error() << "LbPmxVisa::CPmxSession::execute" << " - "
+                              << "::InterlockedCompareExchange failed for session " << this;
+        }
+        throw;
+    }
+    if (LbCore::interlockedCompareExchange(&m_lBusy, 0, 1) != 1) {
+        s_cLogger.error() << "LbPmxVisa::CPmxSession::execute" << " - " << "::InterlockedCompareExchange failed for session "
+                          << this;
+    }
+}
+
+void CPmxSession::write(const std::string& command)
+{
+    class CWriteCommand : public CSessionCommand {
+    public:
+        explicit CWriteCommand(const std::string& text) : m_sText(text) {}
+
+        void execute(CPmxSession& session) override
+        {
+            std::string head = m_sText.substr(0, m_sText.find_first_of("\r\n"));
+            if (scpiCompare("FETCh?", head.c_str()) == 0) {
+                s_cLogger.debug() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
+                                  << "fetch command executed " << &session;
+                return;
+            }
+            clearMessages(session.m_cMessageQueue);
+            ++session.m_nCommandCount;
+            session.changeState(CIPmxSessionState::noData());
+            CPmxSessionDispatcher* dispatcher = session.getParent();
+            dispatcher->callChecked(&CIPmxCommands::emptyAllBuffers, session);
+            s_cLogger.debug() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
+                              << "Execute PmxSendCommand(...) [" << m_sText << "] for session " << &session;
+            dispatcher->callChecked(&CIPmxCommands::sendCommand, session, m_sText);
+
+            // Answers of earlier commands that were never accounted for are purged, so the
+            // answer awaited below belongs to this command.
+            int result = CMessageQueue::RESULT_ITEM;
+            while (session.m_nMessageCount + 1 < session.m_nCommandCount && result == CMessageQueue::RESULT_ITEM) {
+                s_cLogger.warn() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
+                                 << "Asynchronous Message detected! Will be deleted to ensure stable further working!";
+                if (session.m_cMessageQueue.size() >= 1) {
+                    CPmxSessionMessage* stale = 0;
+                    result = session.m_cMessageQueue.pop(stale, 0);
+                    if (result == CMessageQueue::RESULT_ITEM) {
+                        delete stale;
+                    }
+                }
+                ++session.m_nMessageCount;
+            }
+
+            CPmxSessionMessage* message = 0;
+            if (session.m_cMessageQueue.pop(message, toWait(session.m_nTimeout)) != CMessageQueue::RESULT_ITEM) {
+                s_cLogger.info() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
+                                 << "No message arrived for session " << &session;
+                ++session.m_nMessageCount;
+                return;
+            }
+            std::unique_ptr<CPmxSessionMessage> owner(message);
+            s_cLogger.debug() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - " << "Message arrived "
+                              << session.m_nMessageCount << " / " << session.m_nCommandCount << " for session "
+                              << &session;
+            s_cLogger.debug() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
+                              << "Delivering message for session " << &session;
+            owner->deliver();
+            ++session.m_nMessageCount;
+        }
+
+    private:
+        const std::string& m_sText;
+    };
+
+    typedef boost::tokenizer<boost::char_separator<char> > CTokenizer;
+    static const boost::char_separator<char> s_cSeparator(";", "", boost::drop_empty_tokens);
+    CTokenizer tokens(command, s_cSeparator);
+    for (CTokenizer::iterator it = tokens.begin(); it != tokens.end(); ++it) {
+        std::string token(*it);
+        for (std::string::iterator c = token.begin(); c != token.end(); ++c) {
+            *c = static_cast<char>(std::tolower(static_cast<unsigned char>(*c)));
+        }
+        if (!token.empty() && token[0] == ':') {
+            token.erase(0, 1);
+        }
+        s_cLogger.info() << "LbPmxVisa::CPmxSession::write" << " - " << "Writing to Session " << this << " with command "
+                         << token;
+        switch (CPmxScpiCommandParser::getInstance().parse(token)) {
+        case CPmxScpiCommandParser::COMMAND_SYSTEM_ERROR_QUERY: {
+            class CErrorQueueCommand : public CSessionCommand {
+            public:
+                void execute(CPmxSession& session) override
+                {
+                    session.changeState(CIPmxSessionState::errorQueueToNoData());
+                }
+            };
+            static CErrorQueueCommand s_cCommand;
+            execute(s_cCommand);
+            break;
+        }
+        case CPmxScpiCommandParser::COMMAND_OPERATION_CONDITION_QUERY: {
+            class CErrorQueueCommand : public CSessionCommand {
+            public:
+                void execute(CPmxSession& session) override
+                {
+                    session.changeState(CIPmxSessionState::opStatusToNoData());
+                }
+            };
+            static CErrorQueueCommand s_cCommand;
+            execute(s_cCommand);
+            break;
+        }
+        case CPmxScpiCommandParser::COMMAND_FORMAT_ASCII:
+            m_nDataFormat = 0;
+            break;
+        case CPmxScpiCommandParser::COMMAND_FORMAT_REAL32:
+            m_nDataFormat = 1;
+            break;
+        default: {
+            CWriteCommand writeCommand(token);
+            execute(writeCommand);
+            break;
+        }
+        }
+    }
+}
+
+void CPmxSession::read(CPmxDataBuffer& buffer)
+{
+    class CReadCommand : public CSessionCommand {
+    public:
+        explicit CReadCommand(CPmxDataBuffer& buffer) : m_rBuffer(buffer) {}
+
+        void execute(CPmxSession& session) override
+        {
+            s_cLogger.debug() << "LbPmxVisa::CPmxSession::read::CReadCommand::execute" << " - "
+                              << "Executing GetData(...) method for fetching Pmx-Data for session " << &session;
+            try {
+                m_rBuffer.apply(*session.getState());
+            } catch (...) {
+                session.changeState(CIPmxSessionState::noData());
+                throw;
+            }
+            session.changeState(CIPmxSessionState::noData());
+        }
+
+    private:
+        CPmxDataBuffer& m_rBuffer;
+    };
+
+    s_cLogger.info() << "LbPmxVisa::CPmxSession::read" << " - " << "Reading from session " << this;
+    CReadCommand command(buffer);
+    execute(command);
+}
+
+void CPmxSession::readSTB(std::uint16_t* status)
+{
+    s_cLogger.info() << "LbPmxVisa::CPmxSession::readSTB" << " - " << "Reading status byte register " << this;
+    if (status == 0) {
+        throw std::invalid_argument("NULL pointer status");
+    }
+    std::uint8_t flags = 0;
+    if (!m_cErrorQueue.isEmpty()) {
+        flags |= 4;
+    }
+    if (getState() == CIPmxSessionState::dataAvailable()) {
+        flags |= 16;
+    }
+    std::int32_t trigger = 0;
+    getParent()->callChecked(&CIPmxCommands::getTriggerState, *this, &trigger);
+    if (trigger == 2 || trigger == 3) {
+        flags |= 128;
+    }
+    *status = flags;
+}
+
+void CPmxSession::clear()
+{
+    class CClearCommand : public CSessionCommand {
+    public:
+        void execute(CPmxSession& session) override
+        {
+            s_cLogger.info() << "LbPmxVisa::CPmxSession::clear::CClearCommand::execute" << " - " << "Clearing session "
+                             << &session;
+            session.getParent()->callChecked(&CIPmxCommands::clearDevice, session);
+        }
+    };
+    static CClearCommand s_cCommand;
+    execute(s_cCommand);
+}
+
+const CIPmxSessionState* CPmxSession::getState() const
+{
+    LbCore::CLock<LbCore::CCriticalSection> lock(m_cStateLock);
+    return m_pcState.load();
+}
+
+void CPmxSession::changeState(const CIPmxSessionState* target)
+{
+    LbCore::CLock<LbCore::CCriticalSection> lock(m_cStateLock);
+    const CIPmxSessionState* current = m_pcState.load();
+    s_cLogger.debug() << "LbPmxVisa::CPmxSession::changeState" << " - " << "Changing state from " << current->getName()
+                      << " to " << target->getName() << " for session " << this;
+    try {
+        m_pcState = current->nextState(*this, target);
+    } catch (const CIPmxSessionState::CPmxInvalidStateException&) {
+        s_cLogger.debug() << "LbPmxVisa::CPmxSession::changeState" << " - " << "---ERROR-- CPmxInvalidStateException "
+                          << "Can't change state from " << current->getName() << " into state " << target->getName();
+    }
+}
+
+void CPmxSession::serialize(LbCore::CLogMessage& message) const
+{
+    message << "[Id: " << static_cast<std::int32_t>(static_cast<std::uint32_t>(m_lHandle & 0xFFFFFFFF))
+            << ", State: " << getState()->getName() << ", Resource: " << g_pcPmxSerializer->serialize(m_cResourceInfo)
+            << "]";
+}
+
+void CPmxSession::notifyCommandAcceptedEvent(const CPmxEvent&)
+{
+    class CPmxCommandAcceptedEventMessage : public CPmxSessionMessage {
+    public:
+        void deliver() override {}
+    };
+    CPmxSessionMessage* message = new (std::nothrow) CPmxCommandAcceptedEventMessage();
+    if (message != 0) {
+        m_cMessageQueue.push(message, 0);
+    }
+}
+
+void CPmxSession::notifyDataAvailableEvent(const CPmxEvent&)
+{
+    changeState(CIPmxSessionState::dataAvailable());
+}
+
+void CPmxSession::notifyErrorOccuredEvent(const CPmxEvent& event)
+{
+    class CPmxCommandErrorEventMessage : public CPmxSessionMessage {
+    public:
+        explicit CPmxCommandErrorEventMessage(const CPmxEvent& event) : m_cEvent(event) {}
+        void deliver() override { throw CPmxSessionDispatcher::CPmxCommandException(m_cEvent.value); }
+
+    private:
+        CPmxEvent m_cEvent;
+    };
+    CPmxSessionMessage* message = new (std::nothrow) CPmxCommandErrorEventMessage(event);
+    if (message != 0) {
+        m_cMessageQueue.push(message, 0);
+    }
+}
+
+void CPmxSession::notifyStateChangedEvent(const CPmxEvent&) {}
+
+void CPmxSession::notifyDeviceChangedEvent(const CPmxEvent&)
+{
+    clearMessages(m_cMessageQueue);
+    s_cLogger.warn() << "LbPmxVisa::CPmxSession::notifyDeviceChangedEvent" << " - " << "Device has been changed for session "
+                     << this;
+    changeState(CIPmxSessionState::noData());
+}
+
+} // namespace LbPmxVisa
