@@ -1,0 +1,457 @@
+#include "passport/LbPmxInstrSesn.h"
+
+#include "core/Log.h"
+#include "core/Version.h"
+#include "passport/Passport.h"
+#include "sensor/PmxDataBuffer.h"
+#include "sensor/PmxEventDispatcher.h"
+#include "sensor/PmxResourceInfo.h"
+#include "sensor/PmxSession.h"
+#include "sensor/PmxSessionDispatcher.h"
+#include "sensor/PmxSessionState.h"
+
+#include <cstring>
+#include <exception>
+#include <string>
+#include <vector>
+
+namespace LbPmxPassport {
+
+using LbPmxVisa::CIPmxSessionState;
+using LbPmxVisa::CPmxDataBuffer;
+using LbPmxVisa::CPmxResourceInfo;
+using LbPmxVisa::CPmxSession;
+using LbPmxVisa::CPmxSessionDispatcher;
+
+static LbCore::CLogger s_cLogger = LbCore::CLogManager::getLogger("CLbPmxInstrSesn");
+
+namespace {
+
+const ViUInt16 PASSPORT_INTERFACE_TYPE = 0x8100;
+const std::size_t VISA_TEXT_LIMIT = 255; // bytes of a 256-byte VISA buffer we fill, zero included
+
+// Copies text into a 256-byte VISA buffer; a longer text is cut so that it still ends in a zero.
+void copyText(ViChar* destination, const std::string& text)
+{
+    std::size_t length = text.size() < VISA_TEXT_LIMIT - 1 ? text.size() : VISA_TEXT_LIMIT - 1;
+    std::memcpy(destination, text.data(), length);
+    destination[length] = '\0';
+}
+
+void logError(const char* operation, const char* text)
+{
+    s_cLogger.error() << operation << " - " << text;
+}
+
+// The common exception-to-status mapping of the session operations. Each operation names the
+// statuses of the classes it treats specially; what it does not name is "other std::exception".
+struct CStatusMap {
+    ViStatus busy;
+    ViStatus noData;
+    ViStatus overflow;
+    bool commandCodes; // CPmxCommandException: VI_ERROR_NSUP_OPER for an unknown command
+};
+
+template <class F>
+ViStatus guarded(const char* operation, const CStatusMap& map, F body)
+{
+    try {
+        return body();
+    } catch (const CPmxSession::CPmxSessionIsBusyException& e) {
+        logError(operation, e.what());
+        return map.busy;
+    } catch (const CIPmxSessionState::CPmxNoDataAvailableException& e) {
+        logError(operation, e.what());
+        return map.noData;
+    } catch (const CPmxDataBuffer::CPmxDataBufferOverFlowException& e) {
+        logError(operation, e.what());
+        return map.overflow;
+    } catch (const CPmxSessionDispatcher::CPmxCommandException& e) {
+        logError(operation, e.what());
+        return map.commandCodes && e.getErrorCode() == LbPmxVisa::PMX_UNKNOWN_COMMAND ? VI_ERROR_NSUP_OPER : VI_ERROR_SYSTEM_ERROR;
+    } catch (const std::exception& e) {
+        logError(operation, e.what());
+        return VI_ERROR_SYSTEM_ERROR;
+    } catch (...) {
+        logError(operation, "Unknown exception...");
+        return VI_ERROR_SYSTEM_ERROR;
+    }
+}
+
+const CStatusMap WRITE_MAP = {VI_ERROR_RSRC_BUSY, VI_ERROR_SYSTEM_ERROR, VI_ERROR_SYSTEM_ERROR, true};
+const CStatusMap READ_MAP = {VI_ERROR_RSRC_BUSY, VI_ERROR_TMO, VI_ERROR_USER_BUF, false};
+const CStatusMap TRIGGER_MAP = {VI_ERROR_RSRC_BUSY, VI_ERROR_SYSTEM_ERROR, VI_ERROR_SYSTEM_ERROR, false};
+const CStatusMap PLAIN_MAP = {VI_ERROR_SYSTEM_ERROR, VI_ERROR_SYSTEM_ERROR, VI_ERROR_SYSTEM_ERROR, false};
+
+} // namespace
+
+// ---- listeners
+
+CLbPmxInstrSesn::CVisaEventListener::~CVisaEventListener()
+{
+    try {
+        const boost::shared_ptr<CPmxSession>& session = getParent()->getSensorSession();
+        if (session) {
+            session->getEventDispatcher().removeListener(this);
+        }
+    } catch (...) {
+    }
+}
+
+void CLbPmxInstrSesn::CVisaEventListener::raise(ViEventType type)
+{
+    ViSession session = getParent()->getVisaSession();
+    ViEvent context = 0;
+    ViUInt32 mechanisms = 0;
+    if (CNiViSv::createEvent(session, type, &context, &mechanisms) != VI_SUCCESS) {
+        return;
+    }
+    CNiViSv::raiseEvent(session, context, mechanisms);
+}
+
+// ---- lifecycle
+
+CLbPmxInstrSesn::CLbPmxInstrSesn()
+    : m_nSession(0), m_pcRecord(0), m_nClosed(0), m_nClosingFromDestructor(0),
+      m_cSrqListener(this), m_cUsbListener(this), m_cExceptionListener(this)
+{
+}
+
+CLbPmxInstrSesn::~CLbPmxInstrSesn()
+{
+    if (m_nClosed == 0) {
+        m_nClosingFromDestructor = 1;
+        viClose();
+    }
+}
+
+void CLbPmxInstrSesn::setVisaSession(ViSession session, ViAddr* record)
+{
+    m_nSession = session;
+    m_pcRecord = record;
+}
+
+ViStatus CLbPmxInstrSesn::viOpen(ViConstRsrc name, ViAccessMode, ViUInt32)
+{
+    static const char* const OPERATION = "LbPmxPassport::CLbPmxInstrSesn::viOpen";
+    CPassportLock lock;
+    try {
+        CPmxSessionDispatcher& dispatcher = CPmxSessionDispatcher::getInstance();
+        if (dispatcher.getActiveSessionCount() > MAX_ACTIVE_SESSIONS) {
+            s_cLogger.warn() << OPERATION << " - " << "There are already " << MAX_ACTIVE_SESSIONS << " active devices...";
+            return VI_ERROR_RSRC_NFOUND;
+        }
+        m_pcSession = dispatcher.getSession(CPmxResourceInfo(name == 0 ? std::string() : std::string(name)));
+        try {
+            const ViEventType events[3] = {VI_EVENT_SERVICE_REQ, VI_EVENT_EXCEPTION, VI_EVENT_USB_INTR};
+            CNiViSv::declareEvents(m_nSession, 3, events, 0);
+        } catch (...) {
+        }
+        if (m_pcRecord != 0) {
+            m_pcRecord[2] = static_cast<CBasePassport*>(this);
+        }
+        return CNiViSv::installTable(m_nSession, getVectorTable(), 0, m_nSession, 0);
+    } catch (const std::exception& e) {
+        s_cLogger.error() << OPERATION << " - " << e.what();
+        return VI_ERROR_RSRC_NFOUND;
+    } catch (...) {
+        s_cLogger.error() << OPERATION << " - " << "Unknown error";
+        return VI_ERROR_SYSTEM_ERROR;
+    }
+}
+
+ViStatus CLbPmxInstrSesn::viClose()
+{
+    CPassportLock lock;
+    if (m_pcRecord != 0) {
+        m_pcRecord[2] = 0;
+        m_pcRecord = 0;
+    }
+    if (m_nClosingFromDestructor == 0) {
+        m_nClosed = 1;
+        delete this;
+    }
+    return VI_SUCCESS;
+}
+
+// ---- message-based operations
+
+ViStatus CLbPmxInstrSesn::viWrite(ViConstBuf buffer, ViUInt32 count, ViPUInt32 returnCount)
+{
+    if (buffer == 0) {
+        return VI_ERROR_INV_PARAMETER;
+    }
+    return guarded("LbPmxPassport::CLbPmxInstrSesn::viWrite", WRITE_MAP, [&] {
+        std::string command(reinterpret_cast<const char*>(buffer), count);
+        m_pcSession->write(command);
+        if (returnCount != 0) {
+            *returnCount = static_cast<ViUInt32>(command.size());
+        }
+        return VI_SUCCESS;
+    });
+}
+
+ViStatus CLbPmxInstrSesn::viRead(ViPBuf buffer, ViUInt32 count, ViPUInt32 returnCount)
+{
+    if (buffer == 0) {
+        return VI_ERROR_INV_PARAMETER;
+    }
+    return guarded("LbPmxPassport::CLbPmxInstrSesn::viRead", READ_MAP, [&] {
+        std::uint32_t bytes = 0;
+        CPmxDataBuffer data(*m_pcSession, reinterpret_cast<char*>(buffer), count, &bytes);
+        m_pcSession->read(data);
+        if (returnCount != 0) {
+            *returnCount = bytes;
+        }
+        return VI_SUCCESS;
+    });
+}
+
+ViStatus CLbPmxInstrSesn::viAssertTrigger(ViUInt16)
+{
+    return guarded("LbPmxPassport::CLbPmxInstrSesn::viAssertTrigger", TRIGGER_MAP, [&] {
+        m_pcSession->write("*TRG");
+        return VI_SUCCESS;
+    });
+}
+
+ViStatus CLbPmxInstrSesn::viReadSTB(ViPUInt16 status)
+{
+    if (status == 0) {
+        return VI_ERROR_INV_PARAMETER;
+    }
+    return guarded("LbPmxPassport::CLbPmxInstrSesn::viReadSTB", PLAIN_MAP, [&] {
+        m_pcSession->readSTB(status);
+        return VI_SUCCESS;
+    });
+}
+
+ViStatus CLbPmxInstrSesn::viClear()
+{
+    return guarded("LbPmxPassport::CLbPmxInstrSesn::viClear", PLAIN_MAP, [&] {
+        m_pcSession->clear();
+        return VI_SUCCESS;
+    });
+}
+
+ViStatus CLbPmxInstrSesn::viTerminate(ViUInt16, ViJobId)
+{
+    return VI_ERROR_NSUP_OPER;
+}
+
+ViStatus CLbPmxInstrSesn::findAttribute(ViAttr, ViUInt16, ViAttrState, ViConstString, ViUInt32)
+{
+    return VI_ERROR_NSUP_ATTR;
+}
+
+// ---- resource-manager operations
+
+ViStatus CLbPmxInstrSesn::viParseRsrc(ViSession, ViConstRsrc name, ViPUInt16 type, ViPUInt16 number)
+{
+    try {
+        CPmxResourceInfo resource(name == 0 ? std::string() : std::string(name));
+    } catch (...) {
+        return VI_ERROR_RSRC_NFOUND;
+    }
+    if (type == 0 || number == 0) {
+        return VI_ERROR_INV_PARAMETER;
+    }
+    *number = 0;
+    *type = PASSPORT_INTERFACE_TYPE;
+    return VI_SUCCESS;
+}
+
+ViStatus CLbPmxInstrSesn::viParseRsrcEx(ViSession rm, ViConstRsrc name, ViPUInt16 type, ViPUInt16 number,
+                                        ViChar* resourceClass, ViChar* expandedName, ViChar* alias)
+{
+    ViStatus status = viParseRsrc(rm, name, type, number);
+    if (status != VI_SUCCESS) {
+        return status;
+    }
+    if (resourceClass != 0) {
+        copyText(resourceClass, "INSTR");
+    }
+    if (expandedName != 0 && name != 0) {
+        copyText(expandedName, name);
+    }
+    if (alias != 0) {
+        copyText(alias, "");
+    }
+    return VI_SUCCESS;
+}
+
+ViStatus CLbPmxInstrSesn::viFindRsrc(ViSession rm, ViConstString expression, ViPFindList findList)
+{
+    std::vector<std::string> resources;
+    {
+        CPassportLock lock;
+        try {
+            std::vector<CPmxResourceInfo> devices = CPmxSessionDispatcher::getInstance().getAvailableDevices();
+            for (std::size_t i = 0; i < devices.size(); ++i) {
+                resources.push_back(LbPmxVisa::g_pcVisaSerializer->serialize(devices[i]));
+            }
+        } catch (const std::exception& e) {
+            // The lock is released on the way out and the application gets an error status.
+            s_cLogger.error() << "LbPmxPassport::CLbPmxInstrSesn::viFindRsrc" << " - " << e.what();
+            return VI_ERROR_SYSTEM_ERROR;
+        } catch (...) {
+            s_cLogger.error() << "LbPmxPassport::CLbPmxInstrSesn::viFindRsrc" << " - " << "Unknown exception...";
+            return VI_ERROR_SYSTEM_ERROR;
+        }
+    }
+    ViStatus status = VI_SUCCESS;
+    for (std::size_t i = 0; i < resources.size(); ++i) {
+        const char* resource = resources[i].c_str();
+        ViUInt16 attributeFlag = 0;
+        ViStatus match = CNiViSv::matchRsrc(rm, expression, resource, &attributeFlag);
+        if (match == VI_ERROR_RSRC_NFOUND) {
+            continue;
+        }
+        if (match < VI_SUCCESS) {
+            return match;
+        }
+        if (attributeFlag != 0) {
+            match = CNiViSv::matchAttributes(rm, expression, resource, &findCallback, 0);
+            if (match == VI_ERROR_RSRC_NFOUND) {
+                continue;
+            }
+            if (match < VI_SUCCESS) {
+                return match;
+            }
+        }
+        if (findList == 0) {
+            return VI_ERROR_INV_PARAMETER;
+        }
+        status = CNiViSv::appendFound(*findList, resource, 0);
+        if (status < VI_SUCCESS) {
+            return status;
+        }
+    }
+    return status;
+}
+
+// ---- attributes
+
+namespace {
+const char* const MONTHS[12] = {"Jan", "Feb", "Mar", "Apr", "May", "Jun", "Jul", "Aug", "Sep", "Oct", "Nov", "Dec"};
+
+template <class T>
+void store(void* destination, T value)
+{
+    std::memcpy(destination, &value, sizeof value);
+}
+} // namespace
+
+ViUInt32 CLbPmxInstrSesn::implementationVersion(const char* buildDate, unsigned major, unsigned minor)
+{
+    // "Mmm dd yyyy"; the compiler pads a one-digit day with a blank.
+    std::string date(buildDate == 0 ? "" : buildDate);
+    unsigned month = 0;
+    for (unsigned i = 0; i < 12 && date.size() >= 3; ++i) {
+        if (date.compare(0, 3, MONTHS[i]) == 0) {
+            month = i + 1;
+        }
+    }
+    unsigned day = date.size() >= 6 ? static_cast<unsigned>(std::strtoul(date.substr(4, 2).c_str(), 0, 10)) : 0;
+    unsigned year = date.size() >= 11 ? static_cast<unsigned>(std::strtoul(date.substr(7, 4).c_str(), 0, 10)) : 1999;
+    ViUInt32 datecode = (12u * (year - 1999u) + month) * 100u + day;
+    return (((major * 16u) + (minor % 16u)) << 20) | ((datecode << 4) & 0xFFFF0u) | 0xFu;
+}
+
+ViStatus CLbPmxInstrSesn::viGetAttribute(ViAttr attribute, void* value)
+{
+    if (value == 0) {
+        return VI_ERROR_INV_PARAMETER;
+    }
+    CPmxSession& session = *m_pcSession;
+    CPmxSessionDispatcher& dispatcher = CPmxSessionDispatcher::getInstance();
+    switch (attribute) {
+    case VI_ATTR_RSRC_CLASS: copyText(static_cast<ViChar*>(value), "INSTR"); break;
+    case VI_ATTR_RSRC_NAME:
+        copyText(static_cast<ViChar*>(value), LbPmxVisa::g_pcVisaSerializer->serialize(session.getResourceInfo()));
+        break;
+    case VI_ATTR_RSRC_IMPL_VERSION: {
+        const LbCore::CVersion& version = LbCore::CVersion::getModuleVersion();
+        store<ViUInt32>(value, implementationVersion(__DATE__, version.getFileMajor(), version.getFileMinor()));
+        break;
+    }
+    case VI_ATTR_SEND_END_EN: store<ViUInt16>(value, session.getSendEndEnabled()); break;
+    case VI_ATTR_TERMCHAR: store<ViUInt8>(value, session.getTermChar()); break;
+    case VI_ATTR_TMO_VALUE: store<ViUInt32>(value, static_cast<ViUInt32>(session.getTimeout())); break;
+    case VI_ATTR_SUPPRESS_END_EN: store<ViUInt16>(value, session.getSuppressEndEnabled()); break;
+    case VI_ATTR_TERMCHAR_EN: store<ViUInt16>(value, session.getTermCharEnabled()); break;
+    case VI_ATTR_MANF_NAME: copyText(static_cast<ViChar*>(value), dispatcher.getManufacturerName()); break;
+    case VI_ATTR_MANF_ID: store<ViUInt16>(value, static_cast<ViUInt16>(dispatcher.getManufacturerId())); break;
+    case VI_ATTR_INTF_INST_NAME: copyText(static_cast<ViChar*>(value), "pmx0"); break;
+    case VI_ATTR_RSRC_SPEC_VERSION: store<ViUInt32>(value, 0x00400000u); break;
+    case VI_ATTR_RSRC_MANF_NAME: copyText(static_cast<ViChar*>(value), "National Instruments"); break;
+    case VI_ATTR_RSRC_MANF_ID: store<ViUInt16>(value, 0x0FF6); break;
+    case VI_ATTR_USB_SERIAL_NUM: copyText(static_cast<ViChar*>(value), session.getResourceInfo().getSerialNumber()); break;
+    case VI_ATTR_USB_INTFC_NUM: store<ViInt16>(value, 0); break;
+    case VI_ATTR_USB_PROTOCOL: store<ViInt16>(value, 0); break;
+    default: return VI_ERROR_NSUP_ATTR;
+    }
+    return VI_SUCCESS;
+}
+
+ViStatus CLbPmxInstrSesn::viSetAttribute(ViAttr attribute, ViAttrState value)
+{
+    CPmxSession& session = *m_pcSession;
+    switch (attribute) {
+    case VI_ATTR_SEND_END_EN: session.setSendEndEnabled(value != 0); break;
+    case VI_ATTR_TERMCHAR: session.setTermChar(static_cast<std::uint8_t>(value & 0xFF)); break;
+    case VI_ATTR_TMO_VALUE: session.setTimeout(value); break;
+    case VI_ATTR_SUPPRESS_END_EN: session.setSuppressEndEnabled(value != 0); break;
+    case VI_ATTR_TERMCHAR_EN: session.setTermCharEnabled(value != 0); break;
+    case VI_ATTR_RSRC_IMPL_VERSION:
+    case VI_ATTR_RSRC_SPEC_VERSION:
+    case VI_ATTR_RSRC_MANF_ID:
+    case VI_ATTR_RSRC_NAME:
+    case VI_ATTR_INTF_INST_NAME:
+    case VI_ATTR_RSRC_MANF_NAME: return VI_ERROR_ATTR_READONLY;
+    default: return VI_ERROR_NSUP_ATTR;
+    }
+    return VI_SUCCESS;
+}
+
+// ---- events
+
+LbPmxVisa::CIPmxEventListener* CLbPmxInstrSesn::listenerFor(ViEventType type)
+{
+    switch (type) {
+    case VI_EVENT_SERVICE_REQ: return &m_cSrqListener;
+    case VI_EVENT_USB_INTR: return &m_cUsbListener;
+    case VI_EVENT_EXCEPTION: return &m_cExceptionListener;
+    default: return 0;
+    }
+}
+
+ViStatus CLbPmxInstrSesn::enableListener(ViEventType type, bool enable)
+{
+    if (type == VI_EVENT_IO_COMPLETION) {
+        return VI_SUCCESS;
+    }
+    LbPmxVisa::CIPmxEventListener* listener = listenerFor(type);
+    if (listener == 0) {
+        return VI_ERROR_INV_EVENT;
+    }
+    try {
+        LbPmxVisa::CPmxEventDispatcher& events = m_pcSession->getEventDispatcher();
+        bool changed = enable ? events.addListener(listener) : events.removeListener(listener);
+        return changed ? VI_SUCCESS : VI_ERROR_SYSTEM_ERROR;
+    } catch (...) {
+        return VI_ERROR_SYSTEM_ERROR;
+    }
+}
+
+ViStatus CLbPmxInstrSesn::viEnableEvent(ViEventType type, ViUInt16, ViEventFilter)
+{
+    return enableListener(type, true);
+}
+
+ViStatus CLbPmxInstrSesn::viDisableEvent(ViEventType type, ViUInt16)
+{
+    return enableListener(type, false);
+}
+
+} // namespace LbPmxPassport

@@ -1,0 +1,45 @@
+// Module entry on POSIX: the module's ELF constructor and destructor stand for process attach
+// and detach. This file is linked after every library of the module, so its constructor runs
+// after all static objects are built and its destructor before they go.
+//
+// Configuration: the environment variables LBVIPMX_LOG_LEVEL and LBVIPMX_LOG_FILE stand for the
+// registry values LOG_LEVEL and LOG_FILE, with the same texts and the same 80-byte limit
+// (terminating zero included).
+#include "passport/Passport.h"
+
+#include <cstdlib>
+#include <cstring>
+#include <string>
+
+namespace LbPmxPassport {
+
+bool queryConfigurationValue(const char* name, char (&buffer)[80], unsigned& size)
+{
+    const char* value = std::getenv((std::string("LBVIPMX_") + name).c_str());
+    if (value == 0) {
+        return false;
+    }
+    std::size_t bytes = std::strlen(value) + 1;
+    if (bytes > sizeof buffer) {
+        return false;
+    }
+    std::memcpy(buffer, value, bytes);
+    size = static_cast<unsigned>(bytes);
+    return true;
+}
+
+namespace {
+// A failed attach cannot refuse the load here; without a vector table the runtime never routes
+// an operation to the passport, so a failed attach leaves it inert.
+__attribute__((constructor)) void processAttach()
+{
+    attachProcess();
+}
+
+__attribute__((destructor)) void processDetach()
+{
+    detachProcess();
+}
+} // namespace
+
+} // namespace LbPmxPassport

@@ -1,0 +1,33 @@
+// Module entry on Windows: DllMain process attach/detach, and the configuration read from the
+// passport's registry key.
+#include "passport/Passport.h"
+
+#include <windows.h>
+
+namespace LbPmxPassport {
+
+bool queryConfigurationValue(const char* name, char (&buffer)[80], unsigned& size)
+{
+    HKEY key = 0;
+    if (RegOpenKeyExA(HKEY_LOCAL_MACHINE,
+                      "SOFTWARE\\National Instruments\\NI-VISA for Windows 95/NT\\CurrentVersion\\IoLibraries\\LbViPmx.dll", 0,
+                      KEY_QUERY_VALUE, &key) != ERROR_SUCCESS) {
+        return false;
+    }
+    DWORD bytes = sizeof buffer;
+    LONG result = RegQueryValueExA(key, name, 0, 0, reinterpret_cast<LPBYTE>(buffer), &bytes);
+    RegCloseKey(key);
+    size = bytes;
+    return result == ERROR_SUCCESS;
+}
+
+} // namespace LbPmxPassport
+
+extern "C" BOOL WINAPI DllMain(HINSTANCE, DWORD reason, LPVOID)
+{
+    switch (reason) {
+    case DLL_PROCESS_ATTACH: return LbPmxPassport::attachProcess() ? TRUE : FALSE;
+    case DLL_PROCESS_DETACH: LbPmxPassport::detachProcess(); return TRUE;
+    default: return TRUE;
+    }
+}

@@ -1,0 +1,47 @@
+#ifndef LBPMXPASSPORT_PASSPORT_H
+#define LBPMXPASSPORT_PASSPORT_H
+// Process-wide passport state and the module entry: the passport lock (serialises viOpen,
+// viClose and the collection step of viFindRsrc), the vector table installed on every opened
+// session, the sensor-library adapter, and the LOG_LEVEL / LOG_FILE configuration.
+#include "passport/NiViSv.h"
+
+namespace LbPmxVisa {
+class CPmxControl;
+}
+
+namespace LbPmxPassport {
+
+CNiViSv::THandle getVectorTable();
+
+// Handed to the runtime's attribute matching of viFindRsrc: answers from the session's object.
+ViStatus _VI_FUNCH findCallback(ViSession session, ViAttr attribute, ViUInt16 op, ViAttrState value, ViConstString text,
+                                ViUInt32 reserved);
+
+// Acquires the passport lock for its lifetime (unlimited wait); statuses are not looked at.
+class CPassportLock {
+public:
+    CPassportLock();
+    ~CPassportLock();
+    CPassportLock(const CPassportLock&) = delete;
+    CPassportLock& operator=(const CPassportLock&) = delete;
+};
+
+// Process attach: lock, vector table, configuration, adapter attached to the dispatcher.
+// False when the lock or the vector table could not be created.
+bool attachProcess();
+// Process detach: tells the runtime, detaches the adapter from the dispatcher.
+void detachProcess();
+
+// The sensor-library adapter, created on first use, destroyed at process exit.
+LbPmxVisa::CPmxControl& getAdapter();
+
+// Reads LOG_LEVEL and LOG_FILE and configures logging by their rules.
+void readConfiguration();
+
+// One configuration value (at most 80 bytes including its terminating zero) into buffer;
+// false when it is missing or longer. One implementation per platform.
+bool queryConfigurationValue(const char* name, char (&buffer)[80], unsigned& size);
+
+} // namespace LbPmxPassport
+
+#endif

@@ -1,0 +1,260 @@
+// The passport's boundary with the VISA runtime: the entry functions registered in the vector
+// table, the find callback, process attach/detach and the logging configuration.
+#include "core/Log.h"
+#include "passport/LbPmxInstrSesn.h"
+#include "passport/Passport.h"
+#include "sensor/PmxControl.h"
+#include "sensor/PmxSessionDispatcher.h"
+
+#include <cstring>
+#include <memory>
+#include <new>
+
+namespace LbPmxPassport {
+
+namespace {
+
+CNiViSv::THandle s_hPassportLock = 0;
+CNiViSv::THandle s_hVectorTable = 0;
+
+// The object the runtime's record of a session holds in the passport's slot, or null.
+CBasePassport* objectOf(ViSession session)
+{
+    ViAddr* record = CNiViSv::sessionRecord(session);
+    return record == 0 ? 0 : static_cast<CBasePassport*>(record[2]);
+}
+
+// Each entry function forwards to the session's object. A handle without an object (never
+// opened, or already closed) answers VI_ERROR_INV_OBJECT instead of touching a null pointer.
+template <class F>
+ViStatus forward(ViSession session, F call)
+{
+    CBasePassport* object = objectOf(session);
+    return object == 0 ? VI_ERROR_INV_OBJECT : call(*object);
+}
+
+ViStatus _VI_FUNC entryFindRsrc(ViSession rm, ViConstString expression, ViPFindList findList)
+{
+    return CLbPmxInstrSesn::viFindRsrc(rm, expression, findList);
+}
+
+ViStatus _VI_FUNC entryParseRsrc(ViSession rm, ViConstRsrc name, ViPUInt16 type, ViPUInt16 number)
+{
+    return CLbPmxInstrSesn::viParseRsrc(rm, name, type, number);
+}
+
+ViStatus _VI_FUNC entryParseRsrcEx(ViSession rm, ViConstRsrc name, ViPUInt16 type, ViPUInt16 number,
+                                   ViChar resourceClass[], ViChar expandedName[], ViChar alias[])
+{
+    return CLbPmxInstrSesn::viParseRsrcEx(rm, name, type, number, resourceClass, expandedName, alias);
+}
+
+ViStatus _VI_FUNC entryOpen(ViSession, ViConstRsrc name, ViAccessMode mode, ViUInt32 timeout, ViPSession session)
+{
+    if (session == 0) {
+        return VI_ERROR_INV_PARAMETER;
+    }
+    CLbPmxInstrSesn* object = new (std::nothrow) CLbPmxInstrSesn();
+    if (object == 0) {
+        return VI_ERROR_ALLOC;
+    }
+    object->setVisaSession(*session, CNiViSv::sessionRecord(*session));
+    ViStatus status = object->viOpen(name, mode, timeout);
+    if (status < VI_SUCCESS) {
+        delete object;
+    }
+    return status;
+}
+
+ViStatus _VI_FUNC entryClose(ViObject session)
+{
+    CBasePassport* object = objectOf(session);
+    return object == 0 ? VI_SUCCESS : object->viClose();
+}
+
+ViStatus _VI_FUNC entryGetAttribute(ViObject session, ViAttr attribute, void* value)
+{
+    return forward(session, [&](CBasePassport& o) { return o.viGetAttribute(attribute, value); });
+}
+
+ViStatus _VI_FUNC entrySetAttribute(ViObject session, ViAttr attribute, ViAttrState value)
+{
+    return forward(session, [&](CBasePassport& o) { return o.viSetAttribute(attribute, value); });
+}
+
+ViStatus _VI_FUNC entryTerminate(ViObject session, ViUInt16 degree, ViJobId jobId)
+{
+    return forward(session, [&](CBasePassport& o) { return o.viTerminate(degree, jobId); });
+}
+
+ViStatus _VI_FUNC entryWrite(ViSession session, ViConstBuf buffer, ViUInt32 count, ViPUInt32 returnCount)
+{
+    return forward(session, [&](CBasePassport& o) { return o.viWrite(buffer, count, returnCount); });
+}
+
+ViStatus _VI_FUNC entryRead(ViSession session, ViPBuf buffer, ViUInt32 count, ViPUInt32 returnCount)
+{
+    return forward(session, [&](CBasePassport& o) { return o.viRead(buffer, count, returnCount); });
+}
+
+ViStatus _VI_FUNC entryAssertTrigger(ViSession session, ViUInt16 protocol)
+{
+    return forward(session, [&](CBasePassport& o) { return o.viAssertTrigger(protocol); });
+}
+
+ViStatus _VI_FUNC entryReadSTB(ViSession session, ViPUInt16 status)
+{
+    return forward(session, [&](CBasePassport& o) { return o.viReadSTB(status); });
+}
+
+ViStatus _VI_FUNC entryClear(ViSession session)
+{
+    return forward(session, [&](CBasePassport& o) { return o.viClear(); });
+}
+
+ViStatus _VI_FUNC entryEnableEvent(ViSession session, ViEventType type, ViUInt16 mechanism, ViEventFilter context)
+{
+    return forward(session, [&](CBasePassport& o) { return o.viEnableEvent(type, mechanism, context); });
+}
+
+ViStatus _VI_FUNC entryDisableEvent(ViSession session, ViEventType type, ViUInt16 mechanism)
+{
+    return forward(session, [&](CBasePassport& o) { return o.viDisableEvent(type, mechanism); });
+}
+
+template <class F>
+CNiViSv::TEntry proc(F function)
+{
+    return reinterpret_cast<CNiViSv::TEntry>(reinterpret_cast<void*>(function));
+}
+
+ViStatus registerVectorTable()
+{
+    ViStatus status = CNiViSv::createTable("LbPmxPassport C++ LbPmxInstrSesn Vector Table", 0x00400000, 0, &s_hVectorTable);
+    if (status < VI_SUCCESS) {
+        return status;
+    }
+    const struct {
+        const char* name;
+        CNiViSv::TEntry entry;
+    } operations[] = {
+        {"viFindRsrc", proc(&entryFindRsrc)},
+        {"viParseRsrc", proc(&entryParseRsrc)},
+        {"viParseRsrcEx", proc(&entryParseRsrcEx)},
+        {"viOpen", proc(&entryOpen)},
+        {"viClose", proc(&entryClose)},
+        {"viGetAttribute", proc(&entryGetAttribute)},
+        {"viSetAttribute", proc(&entrySetAttribute)},
+        {"viTerminate", proc(&entryTerminate)},
+        {"viWrite", proc(&entryWrite)},
+        {"viRead", proc(&entryRead)},
+        {"viAssertTrigger", proc(&entryAssertTrigger)},
+        {"viReadSTB", proc(&entryReadSTB)},
+        {"viClear", proc(&entryClear)},
+        {"viEnableEvent", proc(&entryEnableEvent)},
+        {"viDisableEvent", proc(&entryDisableEvent)},
+    };
+    for (std::size_t i = 0; i < sizeof operations / sizeof operations[0]; ++i) {
+        CNiViSv::addOperation(s_hVectorTable, operations[i].name, operations[i].entry);
+    }
+    return VI_SUCCESS;
+}
+
+} // namespace
+
+ViStatus _VI_FUNCH findCallback(ViSession session, ViAttr attribute, ViUInt16 op, ViAttrState value, ViConstString text,
+                                ViUInt32 reserved)
+{
+    return forward(session, [&](CBasePassport& o) { return o.findAttribute(attribute, op, value, text, reserved); });
+}
+
+CNiViSv::THandle getVectorTable()
+{
+    return s_hVectorTable;
+}
+
+CPassportLock::CPassportLock()
+{
+    CNiViSv::acquireLock(s_hPassportLock, 0xFFFFFFFFu, 0);
+}
+
+CPassportLock::~CPassportLock()
+{
+    CNiViSv::releaseLock(s_hPassportLock, 0);
+}
+
+LbPmxVisa::CPmxControl& getAdapter()
+{
+    static LbPmxVisa::CPmxControl s_cAdapter;
+    return s_cAdapter;
+}
+
+bool attachProcess()
+{
+    if (CNiViSv::createLock("LbPmxPassport C++ Passport Semaphore", 1, 1, &s_hPassportLock) < VI_SUCCESS) {
+        return false;
+    }
+    if (registerVectorTable() < VI_SUCCESS) {
+        return false;
+    }
+    readConfiguration();
+    LbPmxVisa::CPmxSessionDispatcher::attach(&getAdapter());
+    return true;
+}
+
+void detachProcess()
+{
+    CNiViSv::detach();
+    LbPmxVisa::CPmxSessionDispatcher::detach(&getAdapter());
+}
+
+// ---- configuration
+
+namespace {
+// The text of a value, never read past its buffer: a value without a terminating zero within
+// its bytes ends at the buffer's end.
+std::string textOf(const char (&buffer)[80], unsigned size)
+{
+    std::size_t length = 0;
+    while (length < size && length < sizeof buffer && buffer[length] != '\0') {
+        ++length;
+    }
+    return std::string(buffer, length);
+}
+
+void readLogFile()
+{
+    static std::unique_ptr<LbCore::CLogFileAppender> s_pcAppender;
+    char buffer[80] = {0};
+    unsigned size = 0;
+    if (!queryConfigurationValue("LOG_FILE", buffer, size) || size < 1 || size > 80 || s_pcAppender) {
+        return;
+    }
+    s_pcAppender.reset(new LbCore::CLogFileAppender(textOf(buffer, size)));
+}
+} // namespace
+
+void readConfiguration()
+{
+    char buffer[80] = {0};
+    unsigned size = 0;
+    if (!queryConfigurationValue("LOG_LEVEL", buffer, size) || size < 1 || size > 80) {
+        return;
+    }
+    // Compared byte for byte including the terminating zero: no case folding, no trimming. A
+    // value that fills all 80 bytes without a zero is no text at all.
+    if (std::memchr(buffer, '\0', sizeof buffer) == 0) {
+        return;
+    }
+    std::string level = textOf(buffer, size);
+    // "NONE", like any other text, changes nothing.
+    static const char* const LEVELS[] = {"DEBUG", "INFO", "WARN", "ERROR", "FATAL"};
+    for (int i = 0; i < 5; ++i) {
+        if (level == LEVELS[i]) {
+            LbCore::CLogManager::setLevel(i);
+            readLogFile();
+        }
+    }
+}
+
+} // namespace LbPmxPassport
