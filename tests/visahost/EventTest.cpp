@@ -1,0 +1,186 @@
+// Events raised by the test passport (a write "EVENT n" raises n service requests) and their
+// delivery through the VISA queue and handlers.
+#include <chrono>
+#include <thread>
+#include <vector>
+
+#include "tests/visahost/VisaFixture.h"
+
+namespace LbVisaHostTest {
+
+class Events : public CVisaTest {
+ protected:
+  void SetUp() override {
+    CVisaTest::SetUp();
+    m_nVi = open("TEST::1::INSTR");
+  }
+  ViSession m_nVi = VI_NULL;
+};
+
+TEST_F(Events, QueueDeliversInOrderAndTimesOut) {
+  ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 3"));
+  std::vector<ViEvent> vContexts;
+  for (ViStatus nExpected : {VI_SUCCESS_QUEUE_NEMPTY, VI_SUCCESS_QUEUE_NEMPTY, VI_SUCCESS}) {
+    ViEventType nType = 0;
+    ViEvent nContext = 0;
+    EXPECT_EQ(nExpected, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, &nType, &nContext));
+    EXPECT_EQ(static_cast<ViEventType>(VI_EVENT_SERVICE_REQ), nType);
+    vContexts.push_back(nContext);
+  }
+  EXPECT_LT(vContexts[0], vContexts[1]);  // in the order raised
+  EXPECT_LT(vContexts[1], vContexts[2]);
+  ViEventType nType = 0;
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(vContexts[0], VI_ATTR_EVENT_TYPE, &nType));
+  EXPECT_EQ(static_cast<ViEventType>(VI_EVENT_SERVICE_REQ), nType);
+  EXPECT_EQ(VI_ERROR_NSUP_ATTR, viGetAttribute(vContexts[0], VI_ATTR_TMO_VALUE, &nType));
+  EXPECT_EQ(VI_ERROR_ATTR_READONLY, viSetAttribute(vContexts[0], VI_ATTR_EVENT_TYPE, 1));
+  EXPECT_EQ(VI_SUCCESS, viClose(vContexts[0]));
+  EXPECT_EQ(VI_ERROR_INV_OBJECT, viClose(vContexts[0]));
+
+  auto tStart = std::chrono::steady_clock::now();
+  EXPECT_EQ(VI_ERROR_TMO, viWaitOnEvent(m_nVi, VI_ALL_ENABLED_EVENTS, 100, &nType, VI_NULL));
+  EXPECT_GE(std::chrono::steady_clock::now() - tStart, std::chrono::milliseconds(90));
+  // Closing the session closes the contexts it delivered.
+  EXPECT_EQ(VI_SUCCESS, viClose(m_nVi));
+  EXPECT_EQ(VI_ERROR_INV_OBJECT, viClose(vContexts[1]));
+}
+
+TEST_F(Events, FullQueueDropsNewEvents) {
+  ASSERT_EQ(VI_SUCCESS, viSetAttribute(m_nVi, VI_ATTR_MAX_QUEUE_LENGTH, 2));
+  ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 5"));
+  ViEvent nFirst = 0, nSecond = 0;
+  EXPECT_EQ(VI_SUCCESS_QUEUE_NEMPTY, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, &nFirst));
+  EXPECT_EQ(VI_SUCCESS, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, &nSecond));
+  EXPECT_EQ(nFirst + 1, nSecond);  // the first two were kept
+  EXPECT_EQ(VI_ERROR_TMO, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 2"));
+  EXPECT_EQ(VI_SUCCESS, viDiscardEvents(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE));
+  EXPECT_EQ(VI_SUCCESS_QUEUE_EMPTY, viDiscardEvents(m_nVi, VI_ALL_ENABLED_EVENTS, VI_ALL_MECH));
+  EXPECT_EQ(VI_ERROR_TMO, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
+}
+
+TEST_F(Events, WaiterInAnotherThreadIsWoken) {
+  ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+  ViStatus nStatus = VI_ERROR_SYSTEM_ERROR;
+  ViEventType nType = 0;
+  std::thread cWaiter([&] {
+    nStatus = viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 30000, &nType, VI_NULL);
+  });
+  EXPECT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
+  cWaiter.join();
+  EXPECT_EQ(VI_SUCCESS, nStatus);
+  EXPECT_EQ(static_cast<ViEventType>(VI_EVENT_SERVICE_REQ), nType);
+}
+
+TEST_F(Events, ClosingTheSessionEndsAWait) {
+  ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+  ViStatus nStatus = VI_SUCCESS;
+  std::thread cWaiter([&] {
+    nStatus = viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_TMO_INFINITE, VI_NULL, VI_NULL);
+  });
+  EXPECT_EQ(VI_SUCCESS, viClose(m_nVi));
+  cWaiter.join();
+  // Either the wait saw the close, or it started after it.
+  EXPECT_EQ(VI_ERROR_INV_OBJECT, nStatus);
+}
+
+struct SCalls {
+  std::vector<int> m_vOrder;
+  ViSession m_nVi = 0;
+  ViEventType m_nType = 0;
+  ViEvent m_nContext = 0;
+  ViStatus m_nContextStatus = VI_ERROR_SYSTEM_ERROR;
+};
+
+ViStatus _VI_FUNCH firstHandler(ViSession vi, ViEventType type, ViEvent context, ViAddr user) {
+  auto *ps = static_cast<SCalls *>(user);
+  ps->m_vOrder.push_back(1);
+  ps->m_nVi = vi;
+  ps->m_nType = type;
+  ps->m_nContext = context;
+  ViEventType nType = 0;
+  ps->m_nContextStatus = viGetAttribute(context, VI_ATTR_EVENT_TYPE, &nType);
+  return VI_SUCCESS;
+}
+
+ViStatus _VI_FUNCH secondHandler(ViSession, ViEventType, ViEvent, ViAddr user) {
+  static_cast<SCalls *>(user)->m_vOrder.push_back(2);
+  return VI_SUCCESS;
+}
+
+ViStatus _VI_FUNCH stopHandler(ViSession, ViEventType, ViEvent, ViAddr user) {
+  static_cast<SCalls *>(user)->m_vOrder.push_back(3);
+  return VI_SUCCESS_NCHAIN;
+}
+
+TEST_F(Events, HandlersAreCalledNewestFirst) {
+  SCalls sCalls;
+  EXPECT_EQ(VI_ERROR_HNDLR_NINSTALLED, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_HNDLR, VI_NULL));
+  ASSERT_EQ(VI_SUCCESS, viInstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, firstHandler, &sCalls));
+  ASSERT_EQ(VI_SUCCESS, viInstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, secondHandler, &sCalls));
+  ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_HNDLR, VI_NULL));
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
+  EXPECT_EQ((std::vector<int>{2, 1}), sCalls.m_vOrder);
+  EXPECT_EQ(m_nVi, sCalls.m_nVi);
+  EXPECT_EQ(static_cast<ViEventType>(VI_EVENT_SERVICE_REQ), sCalls.m_nType);
+  EXPECT_EQ(VI_SUCCESS, sCalls.m_nContextStatus);  // valid while the handler runs
+  EXPECT_EQ(VI_ERROR_INV_OBJECT, viClose(sCalls.m_nContext));  // and closed after it
+  // Nothing went to the queue, which was not enabled.
+  EXPECT_EQ(VI_ERROR_NENABLED, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
+
+  sCalls.m_vOrder.clear();
+  ASSERT_EQ(VI_SUCCESS, viInstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, stopHandler, &sCalls));
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
+  EXPECT_EQ((std::vector<int>{3}), sCalls.m_vOrder);
+
+  EXPECT_EQ(VI_SUCCESS, viUninstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, stopHandler, &sCalls));
+  EXPECT_EQ(VI_ERROR_INV_HNDLR_REF, viUninstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, stopHandler, &sCalls));
+  EXPECT_EQ(VI_ERROR_INV_HNDLR_REF, viUninstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, firstHandler, nullptr));
+  EXPECT_EQ(VI_SUCCESS, viUninstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, VI_ANY_HNDLR, nullptr));
+  EXPECT_EQ(VI_ERROR_INV_HNDLR_REF, viInstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, nullptr, nullptr));
+}
+
+TEST_F(Events, QueueAndHandlerTogether) {
+  SCalls sCalls;
+  ASSERT_EQ(VI_SUCCESS, viInstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, secondHandler, &sCalls));
+  ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_HNDLR, VI_NULL));
+  ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
+  EXPECT_EQ((std::vector<int>{2}), sCalls.m_vOrder);
+  EXPECT_EQ(VI_SUCCESS, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
+}
+
+TEST_F(Events, EnableAndDisableReachThePassportOnce) {
+  // The test passport refuses a second enable like the real one; the runtime keeps it from
+  // seeing one.
+  EXPECT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+  EXPECT_EQ(VI_SUCCESS_EVENT_EN, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+  EXPECT_EQ(VI_SUCCESS, viDisableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE));
+  EXPECT_EQ(VI_SUCCESS_EVENT_DIS, viDisableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE));
+  EXPECT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+  EXPECT_EQ(VI_SUCCESS, viDisableEvent(m_nVi, VI_ALL_ENABLED_EVENTS, VI_ALL_MECH));
+  // Disabled events are not created, so nothing is queued.
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
+  EXPECT_EQ(VI_ERROR_NENABLED, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
+}
+
+TEST_F(Events, WrongTypesAndMechanisms) {
+  EXPECT_EQ(VI_ERROR_INV_EVENT, viEnableEvent(m_nVi, VI_EVENT_TRIG, VI_QUEUE, VI_NULL));
+  EXPECT_EQ(VI_ERROR_INV_EVENT, viEnableEvent(m_nVi, VI_ALL_ENABLED_EVENTS, VI_QUEUE, VI_NULL));
+  EXPECT_EQ(VI_ERROR_INV_EVENT, viEnableEvent(m_nRm, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+  EXPECT_EQ(VI_ERROR_INV_MECH, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL));
+  EXPECT_EQ(VI_ERROR_INV_MECH, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, 8, VI_NULL));
+  EXPECT_EQ(VI_ERROR_NSUP_MECH, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_SUSPEND_HNDLR, VI_NULL));
+  EXPECT_EQ(VI_ERROR_INV_CONTEXT, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, 1));
+  EXPECT_EQ(VI_ERROR_INV_EVENT, viDisableEvent(m_nVi, VI_EVENT_TRIG, VI_QUEUE));
+  EXPECT_EQ(VI_ERROR_INV_MECH, viDisableEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0));
+  EXPECT_EQ(VI_ERROR_INV_EVENT, viWaitOnEvent(m_nVi, VI_EVENT_TRIG, 0, VI_NULL, VI_NULL));
+  EXPECT_EQ(VI_ERROR_NENABLED, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
+  EXPECT_EQ(VI_ERROR_INV_EVENT, viInstallHandler(m_nVi, VI_EVENT_TRIG, secondHandler, nullptr));
+  // VI_EVENT_IO_COMPLETION is always accepted, though the passport never raises it.
+  EXPECT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_IO_COMPLETION, VI_QUEUE, VI_NULL));
+}
+
+}  // namespace LbVisaHostTest
