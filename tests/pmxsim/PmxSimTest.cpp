@@ -1,0 +1,624 @@
+// The simulated sensor-control library through its exported C interface, as a client sees it.
+#include "pmxsim/PmxSim.h"
+
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <cstdlib>
+#include <cstring>
+#include <functional>
+#include <future>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <vector>
+
+namespace {
+
+const std::chrono::seconds kDeadline(20);
+
+enum EKind { eAccepted, eState, eData, eError, eDevice };
+
+struct SCall {
+    EKind kind;
+    int64_t handle;
+    int32_t value;
+    std::thread::id thread;
+    bool operator==(const SCall& other) const
+    {
+        return kind == other.kind && handle == other.handle && value == other.value;
+    }
+};
+
+std::ostream& operator<<(std::ostream& out, const SCall& call)
+{
+    return out << "{" << call.kind << "," << call.handle << "," << call.value << "}";
+}
+
+// Records every callback; tests wait on it with a deadline, never with a sleep.
+class CRecorder {
+public:
+    void add(EKind kind, int64_t handle, int32_t value)
+    {
+        std::lock_guard<std::mutex> lock(m_aMutex);
+        m_aCalls.push_back(SCall{ kind, handle, value, std::this_thread::get_id() });
+        m_aChanged.notify_all();
+        if (m_fnHook)
+            m_fnHook(kind, handle, value);
+    }
+    // Waits until at least count calls satisfy pred.
+    bool waitFor(const std::function<bool(const SCall&)>& pred, size_t count = 1)
+    {
+        std::unique_lock<std::mutex> lock(m_aMutex);
+        return m_aChanged.wait_for(lock, kDeadline, [&] {
+            size_t matching = 0;
+            for (const SCall& call : m_aCalls)
+                matching += pred(call) ? 1 : 0;
+            return matching >= count;
+        });
+    }
+    bool waitCount(size_t count)
+    {
+        std::unique_lock<std::mutex> lock(m_aMutex);
+        return m_aChanged.wait_for(lock, kDeadline, [&] { return m_aCalls.size() >= count; });
+    }
+    std::vector<SCall> calls()
+    {
+        std::lock_guard<std::mutex> lock(m_aMutex);
+        return m_aCalls;
+    }
+    void clear()
+    {
+        std::lock_guard<std::mutex> lock(m_aMutex);
+        m_aCalls.clear();
+    }
+    // Runs on the callback thread, after recording (set before the driver opens).
+    std::function<void(EKind, int64_t, int32_t)> m_fnHook;
+
+private:
+    std::mutex m_aMutex;
+    std::condition_variable m_aChanged;
+    std::vector<SCall> m_aCalls;
+};
+
+void onAccepted(int64_t h, int32_t v, void* user)
+{
+    static_cast<CRecorder*>(user)->add(eAccepted, h, v);
+}
+void onState(int64_t h, int32_t v, void* user)
+{
+    static_cast<CRecorder*>(user)->add(eState, h, v);
+}
+void onData(int64_t h, int32_t v, void* user)
+{
+    static_cast<CRecorder*>(user)->add(eData, h, v);
+}
+void onError(int64_t h, int32_t v, void* user)
+{
+    static_cast<CRecorder*>(user)->add(eError, h, v);
+}
+void onDevice(void* user)
+{
+    static_cast<CRecorder*>(user)->add(eDevice, 0, 0);
+}
+
+void registerAll(CRecorder* recorder)
+{
+    ASSERT_EQ(0, PmxSetNotifyCallbackCommandAccepted(onAccepted, recorder));
+    ASSERT_EQ(0, PmxSetNotifyCallbackStateChanged(onState, recorder));
+    ASSERT_EQ(0, PmxSetNotifyCallbackDataAvailable(onData, recorder));
+    ASSERT_EQ(0, PmxSetNotifyCallbackErrorOccurred(onError, recorder));
+    ASSERT_EQ(0, PmxSetNotifyCallbackDeviceChanged(onDevice, recorder));
+}
+
+bool isAccepted(const SCall& c)
+{
+    return c.kind == eAccepted;
+}
+
+class PmxSimTest : public ::testing::Test {
+protected:
+    void SetUp() override
+    {
+        ASSERT_EQ(0, PmxSimReset());
+        ASSERT_EQ(0, PmxSimSetDelays(0, 0));
+        registerAll(&m_aRecorder);
+        ASSERT_EQ(0, PmxOpenDriver());
+    }
+    void TearDown() override { EXPECT_EQ(0, PmxSimReset()); }
+
+    int64_t open(const char* descriptor = "USB::0x0c6f::0003::100000")
+    {
+        int64_t handle = 0;
+        EXPECT_EQ(0, PmxOpenSensor(descriptor, &handle));
+        return handle;
+    }
+    // Sends a command and waits for its acknowledgement.
+    void command(int64_t handle, const char* text)
+    {
+        size_t before = 0;
+        for (const SCall& c : m_aRecorder.calls())
+            if (c.kind == eAccepted && c.handle == handle)
+                ++before;
+        ASSERT_EQ(0, PmxSendCommand(handle, text, 0));
+        ASSERT_TRUE(m_aRecorder.waitFor(
+            [&](const SCall& c) { return c.kind == eAccepted && c.handle == handle; }, before + 1))
+            << text;
+    }
+    std::string errorText(int32_t code)
+    {
+        char text[256] = "";
+        EXPECT_EQ(0, PmxGetErrorText(code, text, sizeof text));
+        return text;
+    }
+
+    CRecorder m_aRecorder;
+};
+
+TEST_F(PmxSimTest, MeasurementReportsStatesThenResultOnOneLibraryThreadInOrder)
+{
+    int64_t handle = open();
+    ASSERT_GT(handle, int64_t(0xFFFFFFFF)) << "handles need all 64 bits";
+    ASSERT_EQ(0, PmxSendCommand(handle, "*TRG", 0));
+    ASSERT_TRUE(
+        m_aRecorder.waitFor([&](const SCall& c) { return c.kind == eState && c.value == 0; }));
+
+    std::vector<SCall> calls = m_aRecorder.calls();
+    std::vector<SCall> expected = { { eAccepted, handle, 1, {} }, { eState, handle, 2, {} },
+        { eState, handle, 3, {} }, { eData, handle, 6, {} }, { eState, handle, 0, {} } };
+    EXPECT_EQ(expected, calls);
+    for (const SCall& call : calls) {
+        EXPECT_NE(std::this_thread::get_id(), call.thread);
+        EXPECT_EQ(calls.front().thread, call.thread);
+    }
+
+    int32_t type = -1, count = -1, pending = -1;
+    ASSERT_EQ(0, PmxGetData(handle, &type, &count, &pending));
+    EXPECT_EQ(6, type);
+    EXPECT_EQ(1, count);
+    EXPECT_EQ(1, pending);
+    float dbm = 0, second = 1, third = 1;
+    ASSERT_EQ(0, PmxGetFloatResult(handle, &dbm, &second, &third));
+    EXPECT_GT(dbm, -21.0f);
+    EXPECT_LT(dbm, -19.0f);
+    EXPECT_EQ(0.0f, second);
+    EXPECT_EQ(0.0f, third);
+    EXPECT_EQ(PMX_ERR_NO_MORE_RESULTS, PmxGetData(handle, &type, &count, &pending));
+    EXPECT_EQ(0, PmxEmptyAllBuffers(handle));
+}
+
+TEST_F(PmxSimTest, IdentificationIsATextResultAfterTheAcknowledgement)
+{
+    int64_t handle = open("usb::0X0C6F::0154::100001");
+    ASSERT_EQ(0, PmxSendCommand(handle, "*idn?\n", 0));
+    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eData; }));
+    std::vector<SCall> expected = { { eAccepted, handle, 1, {} }, { eData, handle, 10, {} } };
+    EXPECT_EQ(expected, m_aRecorder.calls());
+    char text[64];
+    EXPECT_EQ(PMXSIM_E_TYPE_MISMATCH, PmxGetFloatResult(handle, nullptr, nullptr, nullptr));
+    EXPECT_EQ(PMXSIM_E_BUFFER_TOO_SMALL, PmxGetStringResult(handle, text, 33));
+    ASSERT_EQ(0, PmxGetStringResult(handle, text, 34));
+    EXPECT_STREQ("Marlowe&Tenby,PMX-M10,100001,1.20", text);
+    EXPECT_EQ(PMX_ERR_NO_MORE_RESULTS, PmxGetStringResult(handle, text, sizeof text));
+}
+
+TEST_F(PmxSimTest, UnknownAndIgnoredCommandsReportErrorsBeforeTheAcknowledgement)
+{
+    int64_t handle = open();
+    command(handle, "bogus:command");
+    command(handle, "init:cont off");
+    command(handle, "func sideways");
+    std::vector<SCall> expected
+        = { { eError, handle, PMX_ERR_UNKNOWN_COMMAND, {} }, { eAccepted, handle, 1, {} },
+              { eError, handle, PMX_INFO_COMMAND_IGNORED, {} }, { eAccepted, handle, 2, {} },
+              { eError, handle, PMX_ERR_UNKNOWN_COMMAND, {} }, { eAccepted, handle, 3, {} } };
+    EXPECT_EQ(expected, m_aRecorder.calls());
+    int32_t state = -1;
+    EXPECT_EQ(0, PmxGetTriggerState(handle, &state));
+    EXPECT_EQ(0, state);
+}
+
+TEST_F(PmxSimTest, TraceFunctionAndContinuousMeasurement)
+{
+    int64_t handle = open();
+    command(handle, ":FUNCtion \"TRACe\"");
+    command(handle, "trac:poin 8");
+    command(handle, "INITiate:CONTinuous ON");
+    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eData; }, 3));
+    // A second start while running is ignored with the benign notice.
+    command(handle, "init");
+    ASSERT_TRUE(
+        m_aRecorder.waitFor([](const SCall& c) { return c.value == PMX_INFO_COMMAND_IGNORED; }));
+    command(handle, "init:cont 0");
+    ASSERT_TRUE(m_aRecorder.waitFor(
+        [&](const SCall& c) { return c.kind == eState && c.value == 0 && c.handle == handle; }));
+
+    int32_t type = -1, count = -1, pending = -1;
+    ASSERT_EQ(0, PmxGetData(handle, &type, &count, &pending));
+    EXPECT_EQ(4, type);
+    EXPECT_EQ(8, count);
+    EXPECT_GE(pending, 3);
+    float trace[8];
+    int32_t got = 0;
+    EXPECT_EQ(PMXSIM_E_BUFFER_TOO_SMALL, PmxGetFloatArray(handle, trace, 7, &got));
+    ASSERT_EQ(0, PmxGetFloatArray(handle, trace, 8, &got));
+    ASSERT_EQ(8, got);
+    EXPECT_LT(trace[0], -50.0f);
+    EXPECT_GT(trace[4], -25.0f);
+    EXPECT_EQ(0, PmxEmptyAllBuffers(handle));
+    EXPECT_EQ(PMX_ERR_NO_MORE_RESULTS, PmxGetData(handle, &type, &count, &pending));
+}
+
+TEST_F(PmxSimTest, EveryDataTypeIsDeliveredWithTheQueuedValues)
+{
+    int64_t handle = open();
+    const uint8_t bytes[] = { 0, 1, 2, 255 };
+    const int32_t ints[] = { -7, 8, 1 << 30, 99 };
+    const float floats[] = { 1.5f, -2.25f, 3.0f, 4.0f };
+    for (int32_t type = 0; type <= 11; ++type) {
+        SCOPED_TRACE(type);
+        bool isBytes = type == 0 || type == 10;
+        bool isInts = type == 1 || type == 2 || type == 3 || type == 8 || type == 9;
+        const void* values = isBytes ? static_cast<const void*>(bytes)
+            : isInts                 ? static_cast<const void*>(ints)
+                                     : static_cast<const void*>(floats);
+        int32_t queued = type == 10 ? 3 : 4;
+        if (type == 10)
+            values = "abc";
+        ASSERT_EQ(0, PmxSimQueueResult("100000", type, values, queued));
+        ASSERT_TRUE(m_aRecorder.waitFor(
+            [&](const SCall& c) { return c.kind == eData && c.value == type; }));
+
+        int32_t reported = -1, count = -1, pending = -1;
+        ASSERT_EQ(0, PmxGetData(handle, &reported, &count, &pending));
+        EXPECT_EQ(type, reported);
+        EXPECT_EQ(queued, count);
+        EXPECT_EQ(1, pending);
+        if (type == 0) {
+            uint8_t got[8];
+            int32_t n = 0;
+            ASSERT_EQ(0, PmxGetBinaryResult(handle, got, sizeof got, &n));
+            ASSERT_EQ(4, n);
+            EXPECT_EQ(0, std::memcmp(bytes, got, 4));
+        } else if (type == 10) {
+            char got[8];
+            ASSERT_EQ(0, PmxGetStringResult(handle, got, sizeof got));
+            EXPECT_STREQ("abc", got);
+        } else if (type <= 3 || type == 8 || type == 9) {
+            int32_t a = 0, b = 0, c = 0;
+            auto getter = type <= 3 ? PmxGetBitfieldResult : PmxGetLongResult;
+            auto other = type <= 3 ? PmxGetLongResult : PmxGetBitfieldResult;
+            EXPECT_EQ(PMXSIM_E_TYPE_MISMATCH, other(handle, &a, &b, &c));
+            ASSERT_EQ(0, getter(handle, &a, &b, &c));
+            EXPECT_EQ(-7, a);
+            EXPECT_EQ(8, b);
+            EXPECT_EQ(1 << 30, c);
+        } else if (type == 4 || type == 11) {
+            float a1[4] = {}, a2[4] = { 9, 9, 9, 9 }, a3[4] = { 9, 9, 9, 9 };
+            int32_t n = 0;
+            if (type == 4) {
+                EXPECT_EQ(PMXSIM_E_TYPE_MISMATCH, PmxGetAuxFloatArray(handle, a1, a2, a3, 4, &n));
+                ASSERT_EQ(0, PmxGetFloatArray(handle, a1, 4, &n));
+            } else {
+                EXPECT_EQ(PMXSIM_E_TYPE_MISMATCH, PmxGetFloatArray(handle, a1, 4, &n));
+                ASSERT_EQ(0, PmxGetAuxFloatArray(handle, a1, a2, a3, 4, &n));
+                EXPECT_EQ(0.0f, a2[3]);
+                EXPECT_EQ(0.0f, a3[0]);
+            }
+            ASSERT_EQ(4, n);
+            EXPECT_EQ(0, std::memcmp(floats, a1, sizeof a1));
+        } else {
+            float a = 0, b = 0, c = 0;
+            ASSERT_EQ(0, PmxGetFloatResult(handle, &a, &b, &c));
+            EXPECT_EQ(1.5f, a);
+            EXPECT_EQ(-2.25f, b);
+            EXPECT_EQ(3.0f, c);
+        }
+        EXPECT_EQ(PMX_ERR_NO_MORE_RESULTS, PmxGetData(handle, &reported, &count, &pending));
+    }
+    EXPECT_EQ(PMXSIM_E_INVALID_ARGUMENT, PmxSimQueueResult("100000", 12, floats, 1));
+    EXPECT_EQ(PMXSIM_E_INVALID_ARGUMENT, PmxSimQueueResult("100000", 6, nullptr, 1));
+    EXPECT_EQ(PMXSIM_E_SENSOR_NOT_OPEN, PmxSimQueueResult("100001", 6, floats, 1));
+}
+
+TEST_F(PmxSimTest, NullCallbackStopsThatCallbackOnly)
+{
+    int64_t handle = open();
+    ASSERT_EQ(0, PmxSetNotifyCallbackCommandAccepted(nullptr, nullptr));
+    ASSERT_EQ(0, PmxSendCommand(handle, "*idn?", 0));
+    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eData; }));
+    std::vector<SCall> expected = { { eData, handle, 10, {} } };
+    EXPECT_EQ(expected, m_aRecorder.calls());
+}
+
+TEST_F(PmxSimTest, ControlFunctionsFireTheirCallbacks)
+{
+    int64_t handle = open();
+    ASSERT_EQ(0, PmxSimSetTriggerState("100000", 3));
+    ASSERT_EQ(0, PmxSimReportError("100000", 0x1234));
+    ASSERT_EQ(0, PmxSimReportError("", PMX_INFO_COMMAND_IGNORED));
+    ASSERT_EQ(0, PmxSimAttach("PMX-M33", "200"));
+    ASSERT_EQ(0, PmxSimSetDeviceFlag("200", 0));
+    ASSERT_TRUE(m_aRecorder.waitCount(5));
+    std::vector<SCall> expected = { { eState, handle, 3, {} }, { eError, handle, 0x1234, {} },
+        { eError, 0, PMX_INFO_COMMAND_IGNORED, {} }, { eDevice, 0, 0, {} }, { eDevice, 0, 0, {} } };
+    EXPECT_EQ(expected, m_aRecorder.calls());
+    int32_t state = 0;
+    ASSERT_EQ(0, PmxGetTriggerState(handle, &state));
+    EXPECT_EQ(3, state);
+
+    int32_t count = 0, flag = -1;
+    char name[256], type[256], serial[256];
+    ASSERT_EQ(0, PmxGetDeviceListLength(&count));
+    ASSERT_EQ(3, count);
+    ASSERT_EQ(0, PmxGetDeviceInfo(0, name, type, serial, &flag));
+    EXPECT_STREQ("USB::0x0c6f::0003::100000", name);
+    EXPECT_STREQ("PMX-M01", type);
+    EXPECT_STREQ("100000", serial);
+    EXPECT_EQ(1, flag);
+    ASSERT_EQ(0, PmxGetDeviceInfo(2, name, type, serial, &flag));
+    EXPECT_STREQ("PMX-M33", type);
+    EXPECT_STREQ("200", serial);
+    EXPECT_EQ(0, flag);
+    EXPECT_EQ(PMXSIM_E_INDEX_OUT_OF_RANGE, PmxGetDeviceInfo(3, name, type, serial, &flag));
+    EXPECT_EQ(PMXSIM_E_ALREADY_ATTACHED, PmxSimAttach("PMX-M01", "200"));
+    EXPECT_EQ(PMXSIM_E_INVALID_ARGUMENT, PmxSimAttach("PMX-M01", "a:b"));
+}
+
+TEST_F(PmxSimTest, FailureInjectionReachesTheNamedFunctionOnce)
+{
+    int64_t handle = open();
+    ASSERT_EQ(0, PmxSimQueueResult("100000", 9, nullptr, 0));
+    ASSERT_EQ(0, PmxSimFailNext("PmxGetData", 0x7777));
+    int32_t type = -1;
+    EXPECT_EQ(0x7777, PmxGetData(handle, &type, nullptr, nullptr));
+    EXPECT_EQ(-1, type);
+    EXPECT_EQ(0, PmxGetData(handle, &type, nullptr, nullptr));
+    EXPECT_EQ(9, type);
+
+    ASSERT_EQ(0, PmxSimFailNext("PmxCloseDriver", -5));
+    EXPECT_EQ(-5, PmxCloseDriver());
+    int32_t count = 0;
+    EXPECT_EQ(0, PmxGetDeviceListLength(&count)) << "a failed close leaves the driver open";
+    ASSERT_EQ(0, PmxSimFailNext("PmxSetNotifyCallbackCommandAccepted", 42));
+    EXPECT_EQ(42, PmxSetNotifyCallbackCommandAccepted(nullptr, nullptr));
+    command(handle, "*cls"); // the registration failed, so the acknowledgement still arrives
+
+    ASSERT_EQ(0, PmxSimFailNext("PmxOpenSensor", 1));
+    ASSERT_EQ(0, PmxSimFailNext("PmxOpenSensor", 0)); // cancelled
+    int64_t second = 0;
+    EXPECT_EQ(0, PmxOpenSensor("USB::0x0c6f::0154::100001", &second));
+    EXPECT_EQ(PMXSIM_E_INVALID_ARGUMENT, PmxSimFailNext("PmxNoSuchFunction", 1));
+}
+
+TEST_F(PmxSimTest, DetachMidSessionFailsLaterCallsCleanly)
+{
+    int64_t handle = open();
+    ASSERT_EQ(0, PmxSimQueueResult("100000", 6, nullptr, 0));
+    ASSERT_EQ(0, PmxSimDetach("100000"));
+    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eDevice; }));
+    int32_t value = 0;
+    float f = 0;
+    EXPECT_EQ(PMXSIM_E_SENSOR_DETACHED, PmxSendCommand(handle, "*trg", 0));
+    EXPECT_EQ(PMXSIM_E_SENSOR_DETACHED, PmxGetData(handle, &value, &value, &value));
+    EXPECT_EQ(PMXSIM_E_SENSOR_DETACHED, PmxGetFloatResult(handle, &f, &f, &f));
+    EXPECT_EQ(PMXSIM_E_SENSOR_DETACHED, PmxGetTriggerState(handle, &value));
+    EXPECT_EQ(PMXSIM_E_NO_SUCH_SENSOR, PmxSimQueueResult("100000", 6, nullptr, 0));
+    ASSERT_EQ(0, PmxGetDeviceListLength(&value));
+    EXPECT_EQ(1, value);
+    EXPECT_EQ(0, PmxCloseSensor(handle));
+    EXPECT_EQ(PMXSIM_E_INVALID_HANDLE, PmxCloseSensor(handle));
+
+    // Attached again, it opens under a new handle.
+    ASSERT_EQ(0, PmxSimAttach("PMX-M01", "100000"));
+    int64_t again = open();
+    EXPECT_NE(handle, again);
+    command(again, "*rst");
+}
+
+TEST_F(PmxSimTest, OpeningChecksDescriptorDriverAndUse)
+{
+    int64_t handle = 0;
+    EXPECT_EQ(PMXSIM_E_BAD_DESCRIPTOR, PmxOpenSensor("USB::0x0c6f::3::100000", &handle));
+    EXPECT_EQ(PMXSIM_E_BAD_DESCRIPTOR, PmxOpenSensor("USB::0x0c70::0003::100000", &handle));
+    EXPECT_EQ(PMXSIM_E_BAD_DESCRIPTOR, PmxOpenSensor("USB::0x0c6f::0003::", &handle));
+    EXPECT_EQ(PMXSIM_E_BAD_DESCRIPTOR, PmxOpenSensor("USB::0x0c6f::00a3::100000", &handle));
+    EXPECT_EQ(PMXSIM_E_BAD_DESCRIPTOR, PmxOpenSensor("USB::0x0c6f::0003::100000::INSTR", &handle));
+    EXPECT_EQ(PMXSIM_E_BAD_DESCRIPTOR, PmxOpenSensor("", &handle));
+    EXPECT_EQ(PMXSIM_E_INVALID_ARGUMENT, PmxOpenSensor(nullptr, &handle));
+    EXPECT_EQ(PMXSIM_E_NO_SUCH_SENSOR, PmxOpenSensor("USB::0x0c6f::0154::100000", &handle));
+    EXPECT_EQ(PMXSIM_E_NO_SUCH_SENSOR, PmxOpenSensor("USB::0x0c6f::0003::999", &handle));
+    EXPECT_EQ(0, handle);
+    handle = open();
+    int64_t second = 0;
+    EXPECT_EQ(PMXSIM_E_SENSOR_IN_USE, PmxOpenSensor("USB::0x0c6f::0003::100000", &second));
+    EXPECT_EQ(PMXSIM_E_INVALID_HANDLE, PmxSendCommand(handle + 1, "*trg", 0));
+
+    ASSERT_EQ(0, PmxCloseDriver());
+    EXPECT_EQ(PMXSIM_E_DRIVER_NOT_OPEN, PmxCloseDriver());
+    EXPECT_EQ(PMXSIM_E_DRIVER_NOT_OPEN, PmxSendCommand(handle, "*trg", 0));
+    int32_t count = 0;
+    EXPECT_EQ(PMXSIM_E_DRIVER_NOT_OPEN, PmxGetDeviceListLength(&count));
+    ASSERT_EQ(0, PmxOpenDriver());
+    EXPECT_EQ(PMXSIM_E_INVALID_HANDLE, PmxSendCommand(handle, "*trg", 0))
+        << "closing the driver closes its sensors";
+}
+
+TEST_F(PmxSimTest, EveryCodeHasItsText)
+{
+    EXPECT_EQ("No further result available", errorText(PMX_ERR_NO_MORE_RESULTS));
+    EXPECT_EQ("Unknown command or invalid parameter", errorText(PMX_ERR_UNKNOWN_COMMAND));
+    EXPECT_EQ("Sensor has been detached", errorText(PMXSIM_E_SENSOR_DETACHED));
+    EXPECT_EQ("Unknown error code 0x00001234", errorText(0x1234));
+    const int32_t codes[] = { PMX_SUCCESS, PMX_INFO_COMMAND_IGNORED, PMXSIM_E_DRIVER_NOT_OPEN,
+        PMXSIM_E_INVALID_ARGUMENT, PMXSIM_E_INVALID_HANDLE, PMXSIM_E_BAD_DESCRIPTOR,
+        PMXSIM_E_NO_SUCH_SENSOR, PMXSIM_E_SENSOR_IN_USE, PMXSIM_E_INDEX_OUT_OF_RANGE,
+        PMXSIM_E_TYPE_MISMATCH, PMXSIM_E_BUFFER_TOO_SMALL, PMXSIM_E_SENSOR_NOT_OPEN,
+        PMXSIM_E_ALREADY_ATTACHED, PMXSIM_E_OUT_OF_RESOURCES };
+    for (int32_t code : codes)
+        EXPECT_EQ(std::string::npos, errorText(code).find("Unknown error")) << std::hex << code;
+    char small[5];
+    ASSERT_EQ(0, PmxGetErrorText(PMXSIM_E_DRIVER_NOT_OPEN, small, sizeof small));
+    EXPECT_STREQ("Driv", small);
+    EXPECT_EQ(PMXSIM_E_INVALID_ARGUMENT, PmxGetErrorText(0, small, 0));
+    ASSERT_EQ(0, PmxCloseDriver());
+    EXPECT_EQ("Driver not open", errorText(PMXSIM_E_DRIVER_NOT_OPEN))
+        << "texts need no open driver";
+}
+
+TEST_F(PmxSimTest, AcknowledgementsFollowDelayAndSwitch)
+{
+    int64_t handle = open();
+    ASSERT_EQ(0, PmxSimSetDelays(100, 0));
+    auto start = std::chrono::steady_clock::now();
+    command(handle, "*cls");
+    EXPECT_GE(std::chrono::steady_clock::now() - start, std::chrono::milliseconds(100));
+
+    ASSERT_EQ(0, PmxSimSetDelays(0, 0));
+    ASSERT_EQ(0, PmxSimSetAutoAck(0));
+    ASSERT_EQ(0, PmxSendCommand(handle, "*cls", 0));
+    ASSERT_EQ(0, PmxSendCommand(handle, "bogus", 0));
+    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eError; }));
+    size_t accepted = 0;
+    for (const SCall& c : m_aRecorder.calls())
+        accepted += c.kind == eAccepted;
+    EXPECT_EQ(1u, accepted) << "only the first command was acknowledged";
+    EXPECT_EQ(PMXSIM_E_INVALID_ARGUMENT, PmxSimSetDelays(-1, 0));
+}
+
+TEST_F(PmxSimTest, DeviceListComesFromTheEnvironment)
+{
+    int32_t count = 0;
+    char name[256], type[256], serial[256];
+    int32_t flag = 0;
+    ASSERT_EQ(0, PmxGetDeviceListLength(&count));
+    ASSERT_EQ(2, count);
+    ASSERT_EQ(0, PmxGetDeviceInfo(1, name, type, serial, &flag));
+    EXPECT_STREQ("USB::0x0c6f::0154::100001", name);
+    EXPECT_STREQ("PMX-M10", type);
+
+    auto setList = [](const char* list) {
+#ifdef _WIN32
+        std::string assignment = std::string("PMXSIM_DEVICES=") + list;
+        _putenv(assignment.c_str());
+#else
+        setenv("PMXSIM_DEVICES", list, 1);
+#endif
+    };
+    setList(" PMX-M05:42:0 , BOGUS:7,broken,PMX:42");
+    ASSERT_EQ(0, PmxSimReset());
+    ASSERT_EQ(0, PmxOpenDriver());
+    ASSERT_EQ(0, PmxGetDeviceListLength(&count));
+    ASSERT_EQ(2, count) << "malformed and duplicate entries are skipped";
+    ASSERT_EQ(0, PmxGetDeviceInfo(0, name, type, serial, &flag));
+    EXPECT_STREQ("PMX-M05", type);
+    EXPECT_STREQ("42", serial);
+    EXPECT_EQ(0, flag);
+    ASSERT_EQ(0, PmxGetDeviceInfo(1, name, type, serial, &flag));
+    EXPECT_STREQ("BOGUS 7", name);
+    int64_t handle = 0;
+    EXPECT_EQ(PMXSIM_E_NO_SUCH_SENSOR, PmxOpenSensor("USB::0x0c6f::0000::7", &handle));
+
+    std::vector<const char*> empty = { "None" };
+#ifndef _WIN32
+    empty.push_back(""); // Windows deletes a variable set to nothing
+#endif
+    for (const char* list : empty) {
+        setList(list);
+        ASSERT_EQ(0, PmxSimReset());
+        ASSERT_EQ(0, PmxOpenDriver());
+        ASSERT_EQ(0, PmxGetDeviceListLength(&count));
+        EXPECT_EQ(0, count) << list;
+    }
+#ifdef _WIN32
+    _putenv("PMXSIM_DEVICES=");
+#else
+    unsetenv("PMXSIM_DEVICES");
+#endif
+}
+
+TEST_F(PmxSimTest, CallbacksMayCallBackIntoTheLibraryAndCloseIt)
+{
+    int64_t handle = open();
+    std::promise<std::pair<int32_t, int32_t>> results; // fetch, close
+    CRecorder hooked;
+    hooked.m_fnHook = [&](EKind kind, int64_t h, int32_t) {
+        if (kind == eData) {
+            float value = 0;
+            int32_t fetched = PmxGetFloatResult(h, &value, nullptr, nullptr);
+            PmxSetNotifyCallbackDataAvailable(nullptr, nullptr);
+            results.set_value(std::make_pair(fetched, PmxCloseDriver()));
+        }
+    };
+    registerAll(&hooked);
+    ASSERT_EQ(0, PmxSendCommand(handle, "init:imm", 0));
+    std::future<std::pair<int32_t, int32_t>> done = results.get_future();
+    ASSERT_EQ(std::future_status::ready, done.wait_for(kDeadline));
+    EXPECT_EQ(std::make_pair(0, 0), done.get());
+    // Replacing the callbacks waits until the hooked one has returned.
+    registerAll(&m_aRecorder);
+    int32_t count = 0;
+    EXPECT_EQ(PMXSIM_E_DRIVER_NOT_OPEN, PmxGetDeviceListLength(&count));
+    ASSERT_EQ(0, PmxOpenDriver());
+    EXPECT_EQ(0, PmxGetDeviceListLength(&count));
+}
+
+TEST_F(PmxSimTest, ConcurrentUseFromSeveralThreads)
+{
+    const int kRounds = 30;
+    int64_t a = open();
+    int64_t b = open("USB::0x0c6f::0154::100001");
+    ASSERT_EQ(0, PmxSimSetDelays(0, 1));
+    std::atomic<int> failures(0);
+    auto measure = [&](int64_t handle) {
+        for (int i = 0; i < kRounds; ++i) {
+            if (PmxSendCommand(handle, i % 2 ? "*trg" : "*idn?", 0) != 0)
+                ++failures;
+            int32_t type = 0;
+            while (PmxGetData(handle, &type, nullptr, nullptr) == 0) {
+                float f[3];
+                char text[128];
+                int32_t rc = type == 6 ? PmxGetFloatResult(handle, &f[0], &f[1], &f[2])
+                                       : PmxGetStringResult(handle, text, sizeof text);
+                if (rc != 0 && rc != PMX_ERR_NO_MORE_RESULTS)
+                    ++failures;
+            }
+        }
+    };
+    auto churn = [&] {
+        CRecorder other;
+        for (int i = 0; i < kRounds; ++i) {
+            if (PmxSimAttach("PMX-M02", "777") != 0 || PmxSimDetach("777") != 0)
+                ++failures;
+            PmxSetNotifyCallbackErrorOccurred(i % 2 ? onError : nullptr, &other);
+            int32_t count = 0;
+            char name[256], type[256], serial[256];
+            if (PmxGetDeviceListLength(&count) != 0)
+                ++failures;
+            for (int32_t n = 0; n < count; ++n)
+                PmxGetDeviceInfo(n, name, type, serial, &count);
+            PmxSetNotifyCallbackErrorOccurred(onError, &m_aRecorder);
+        }
+    };
+    std::thread t1(measure, a), t2(measure, b), t3(churn);
+    t1.join();
+    t2.join();
+    t3.join();
+    EXPECT_EQ(0, failures.load());
+    // Every command of both sensors is acknowledged exactly once, in order per sensor.
+    ASSERT_TRUE(m_aRecorder.waitFor(isAccepted, 2 * kRounds));
+    int32_t lastA = 0, lastB = 0;
+    for (const SCall& c : m_aRecorder.calls()) {
+        if (c.kind != eAccepted)
+            continue;
+        int32_t& last = c.handle == a ? lastA : lastB;
+        EXPECT_EQ(last + 1, c.value);
+        last = c.value;
+    }
+    EXPECT_EQ(kRounds, lastA);
+    EXPECT_EQ(kRounds, lastB);
+}
+
+} // namespace
