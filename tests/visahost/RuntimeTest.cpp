@@ -254,6 +254,12 @@ TEST_F(Locks, ExclusiveAndSharedLocksGuardTheResource) {
   EXPECT_EQ(VI_SUCCESS, viClose(nA));  // closing releases the session's locks
   EXPECT_EQ(VI_SUCCESS, viUnlock(nB));
   EXPECT_EQ(VI_SUCCESS, write(nC, "x"));
+
+  ViSession nD = VI_NULL;
+  ASSERT_EQ(VI_SUCCESS, viOpen(m_nRm, "test::1::instr", VI_EXCLUSIVE_LOCK, 0, &nD));
+  EXPECT_EQ(VI_ERROR_RSRC_LOCKED, write(nC, "x"));  // the name's case does not matter
+  EXPECT_EQ(VI_ERROR_TMO, viOpen(m_nRm, "TEST::1::INSTR", VI_EXCLUSIVE_LOCK, 10, &nA));
+  EXPECT_EQ(static_cast<ViSession>(VI_NULL), nA);
 }
 
 }  // namespace LbVisaHostTest
