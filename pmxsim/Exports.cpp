@@ -30,9 +30,9 @@ PMX_API int32_t PmxCloseSensor(int64_t handle)
 {
     return sim().closeSensor(handle);
 }
-PMX_API int32_t PmxSendCommand(int64_t handle, const char* text, int32_t /*timeout*/)
+PMX_API int32_t PmxSendCommand(int64_t handle, const char* text, int32_t timeout)
 {
-    return sim().sendCommand(handle, text);
+    return sim().sendCommand(handle, text, timeout);
 }
 PMX_API int32_t PmxClearDevice(int64_t handle)
 {
@@ -150,6 +150,10 @@ PMX_API int32_t PmxSimReportError(const char* serial, int32_t code)
 PMX_API int32_t PmxSimSetTriggerState(const char* serial, int32_t state)
 {
     return sim().setTriggerState(serial, state);
+}
+PMX_API int32_t PmxSimGetLastCommand(const char* serial, char* text, int32_t size, int32_t* timeout)
+{
+    return sim().getLastCommand(serial, text, size, timeout);
 }
 PMX_API int32_t PmxSimSetDelays(int32_t ackMs, int32_t measureMs)
 {

@@ -53,6 +53,10 @@ PMX_API int32_t PmxSimReportError(const char* serial, int32_t code);
 /* Set the state PmxGetTriggerState reports for the open sensor and fire state changed. */
 PMX_API int32_t PmxSimSetTriggerState(const char* serial, int32_t state);
 
+/* The text and timeout argument of the last PmxSendCommand for the sensor since it was opened
+   (an empty text and 0 when none); the text with its zero must fit size. */
+PMX_API int32_t PmxSimGetLastCommand(const char* serial, char* text, int32_t size, int32_t* timeout);
+
 /* Delay of acknowledgements and duration of one measurement, in milliseconds; 0 = as fast as
    possible. */
 PMX_API int32_t PmxSimSetDelays(int32_t ackMs, int32_t measureMs);

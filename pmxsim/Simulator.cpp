@@ -459,6 +459,8 @@ int32_t CSimulator::openSensor(const char* descriptor, int64_t* handle)
     sensor->bTrace = false;
     sensor->nTracePoints = kDefaultTracePoints;
     sensor->nCommandCount = 0;
+    sensor->strLastCommand.clear();
+    sensor->nLastTimeout = 0;
     sensor->tLastCommand = Clock::time_point();
     sensor->results.clear();
     m_aOpen[sensor->nHandle] = sensor;
@@ -487,8 +489,8 @@ int32_t CSimulator::closeSensor(int64_t handle)
     return PMX_SUCCESS;
 }
 
-// The timeout argument is not used: commands are queued and answered through the callbacks.
-int32_t CSimulator::sendCommand(int64_t handle, const char* text)
+// The timeout argument is only recorded: commands are queued and answered through the callbacks.
+int32_t CSimulator::sendCommand(int64_t handle, const char* text, int32_t timeout)
 {
     std::lock_guard<std::mutex> lock(m_aMutex);
     int32_t code;
@@ -499,6 +501,8 @@ int32_t CSimulator::sendCommand(int64_t handle, const char* text)
         return code;
     if (text == nullptr)
         return PMXSIM_E_INVALID_ARGUMENT;
+    sensor->strLastCommand = text;
+    sensor->nLastTimeout = timeout;
     // Commands of one sensor are answered in the order sent, even when the delay was shortened.
     Clock::time_point due
         = std::max(Clock::now() + std::chrono::milliseconds(m_nAckMs), sensor->tLastCommand);
@@ -1142,6 +1146,22 @@ int32_t CSimulator::setTriggerState(const char* serial, int32_t state)
     if (!sensor)
         return code;
     setState(*sensor, state);
+    return PMX_SUCCESS;
+}
+
+int32_t CSimulator::getLastCommand(const char* serial, char* text, int32_t size, int32_t* timeout)
+{
+    std::lock_guard<std::mutex> lock(m_aMutex);
+    int32_t code;
+    SensorPtr sensor = findOpenBySerial(serial, &code);
+    if (!sensor)
+        return code;
+    if (text == nullptr || size < 1 || timeout == nullptr)
+        return PMXSIM_E_INVALID_ARGUMENT;
+    if (sensor->strLastCommand.size() + 1 > static_cast<size_t>(size))
+        return PMXSIM_E_BUFFER_TOO_SMALL;
+    std::memcpy(text, sensor->strLastCommand.c_str(), sensor->strLastCommand.size() + 1);
+    *timeout = sensor->nLastTimeout;
     return PMX_SUCCESS;
 }
 

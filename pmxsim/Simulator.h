@@ -74,7 +74,7 @@ public:
     int32_t closeDriver();
     int32_t openSensor(const char* descriptor, int64_t* handle);
     int32_t closeSensor(int64_t handle);
-    int32_t sendCommand(int64_t handle, const char* text);
+    int32_t sendCommand(int64_t handle, const char* text, int32_t timeout);
     int32_t clearDevice(int64_t handle);
     int32_t emptyAllBuffers(int64_t handle);
     int32_t getTriggerState(int64_t handle, int32_t* state);
@@ -98,6 +98,7 @@ public:
     int32_t queueResult(const char* serial, int32_t dataType, const void* values, int32_t count);
     int32_t reportError(const char* serial, int32_t code);
     int32_t setTriggerState(const char* serial, int32_t state);
+  int32_t getLastCommand(const char* serial, char* text, int32_t size, int32_t* timeout);
     int32_t setDelays(int32_t ackMs, int32_t measureMs);
     int32_t setAutoAck(int32_t on);
     int32_t failNext(const char* function, int32_t code);
@@ -125,6 +126,8 @@ private:
         bool bTrace = false;
         int32_t nTracePoints = 0;
         int32_t nCommandCount = 0;
+    std::string strLastCommand;  // as sent, with its timeout argument
+    int32_t nLastTimeout = 0;
         Clock::time_point tLastCommand;
         std::deque<SResult> results;
     };

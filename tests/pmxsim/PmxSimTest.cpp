@@ -202,6 +202,16 @@ TEST_F(PmxSimTest, IdentificationIsATextResultAfterTheAcknowledgement)
     ASSERT_EQ(0, PmxGetStringResult(handle, text, 34));
     EXPECT_STREQ("Marlowe&Tenby,PMX-M10,100001,1.20", text);
     EXPECT_EQ(PMX_ERR_NO_MORE_RESULTS, PmxGetStringResult(handle, text, sizeof text));
+
+    int32_t timeout = -1;
+    ASSERT_EQ(0, PmxSimGetLastCommand("100001", text, sizeof text, &timeout));
+    EXPECT_STREQ("*idn?\n", text);
+    EXPECT_EQ(0, timeout);
+    ASSERT_EQ(0, PmxSendCommand(handle, "*cls", 77));
+    ASSERT_EQ(0, PmxSimGetLastCommand("100001", text, sizeof text, &timeout));
+    EXPECT_STREQ("*cls", text);
+    EXPECT_EQ(77, timeout);
+    EXPECT_EQ(PMXSIM_E_BUFFER_TOO_SMALL, PmxSimGetLastCommand("100001", text, 4, &timeout));
 }
 
 TEST_F(PmxSimTest, UnknownAndIgnoredCommandsReportErrorsBeforeTheAcknowledgement)
