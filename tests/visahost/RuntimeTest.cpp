@@ -1,6 +1,8 @@
 // The VISA C API of the runtime, driven against the test passport.
 #include <cstring>
 #include <string>
+#include <thread>
+#include <vector>
 
 #include "tests/visahost/VisaFixture.h"
 
@@ -157,6 +159,31 @@ TEST_F(Sessions, ClosingTheResourceManagerClosesItsSessionsAndLists) {
   EXPECT_EQ(VI_ERROR_INV_OBJECT, viFindNext(nList, szDesc));
   EXPECT_EQ(VI_ERROR_INV_OBJECT, viOpen(nRm, "TEST::1::INSTR", VI_NULL, 0, &nA));
   EXPECT_EQ(VI_SUCCESS, write(nOther, "still open"));  // another manager's session
+}
+
+TEST_F(Sessions, ParallelSessionsKeepTheirOwnState) {
+  std::vector<std::thread> vThreads;
+  std::vector<int> vFailures(4, 0);
+  for (int t = 0; t < 4; ++t) {
+    vThreads.emplace_back([this, t, &vFailures] {
+      for (int i = 0; i < 50; ++i) {
+        ViSession nVi = VI_NULL;
+        if (viOpen(m_nRm, t % 2 ? "TEST::1::INSTR" : "TEST::2::INSTR", VI_NULL, 0, &nVi) != VI_SUCCESS) {
+          ++vFailures[t];
+          continue;
+        }
+        std::string strText = "thread " + std::to_string(t) + " round " + std::to_string(i);
+        char szBuf[64] = {};
+        ViUInt32 nRet = 0;
+        if (write(nVi, strText) != VI_SUCCESS ||
+            viRead(nVi, reinterpret_cast<ViPBuf>(szBuf), sizeof szBuf - 1, &nRet) != VI_SUCCESS ||
+            strText != szBuf || viClose(nVi) != VI_SUCCESS)
+          ++vFailures[t];
+      }
+    });
+  }
+  for (std::thread &c : vThreads) c.join();
+  EXPECT_EQ((std::vector<int>{0, 0, 0, 0}), vFailures);
 }
 
 TEST_F(Sessions, BadInput) {
