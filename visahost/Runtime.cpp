@@ -446,8 +446,19 @@ void CRuntime::loadPassports() {
   for (const std::string &strPath : vPaths) {
     std::string strFull = Module::hasDirectory(strPath) ? strPath : Module::runtimeDirectory() + strPath;
     std::string strError;
-    // A missing or broken configured passport must not stop the others; say why.
-    if (!Module::load(strFull, strError) && bConfigured)
+    bool bLoaded = false, bReport = bConfigured;
+    // A missing or broken passport must not stop the others, nor the resource manager; an
+    // exception that escapes a module's entry counts as a failed load.
+    try {
+      bLoaded = Module::load(strFull, strError);
+    } catch (const std::exception &cError) {
+      strError = std::string("exception in the module entry: ") + cError.what();
+      bReport = true;
+    } catch (...) {
+      strError = "exception in the module entry";
+      bReport = true;
+    }
+    if (!bLoaded && bReport)
       std::fprintf(stderr, "visahost: cannot load passport %s: %s\n", strFull.c_str(),
                    strError.c_str());
   }
