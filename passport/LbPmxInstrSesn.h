@@ -89,7 +89,7 @@ public:
     // VI_ATTR_RSRC_IMPL_VERSION from a build date "Mmm dd yyyy" and the file version.
     static ViUInt32 implementationVersion(const char* buildDate, unsigned major, unsigned minor);
 
-    static const unsigned MAX_ACTIVE_SESSIONS = 127;
+    static constexpr unsigned MAX_ACTIVE_SESSIONS = 127;
 
 private:
     ViStatus enableListener(ViEventType type, bool enable);

@@ -175,9 +175,9 @@ TEST_F(Sessions, AtMost128SensorSessions)
     ViSession refused = VI_NULL;
     EXPECT_EQ(VI_ERROR_RSRC_NFOUND, viOpen(m_nRm, "LBPMX::3::200128", VI_NULL, 0, &refused));
     EXPECT_TRUE(logContains("[WARN ] CLbPmxInstrSesn - LbPmxPassport::CLbPmxInstrSesn::viOpen - There are already 127 active devices..."));
-    // A further VISA session on an open resource is no new sensor session.
-    ViSession shared = open("LBPMX::3::200000");
-    EXPECT_EQ(VI_SUCCESS, viClose(shared));
+    // The limit is checked before the sensor session is looked for: with 128 open, even one
+    // more VISA session on an open resource is refused.
+    EXPECT_EQ(VI_ERROR_RSRC_NFOUND, viOpen(m_nRm, "LBPMX::3::200000", VI_NULL, 0, &refused));
     EXPECT_EQ(VI_SUCCESS, viClose(sessions.back()));
     ViSession now = open("LBPMX::3::200128");
     EXPECT_EQ(VI_SUCCESS, viClose(now));
