@@ -51,7 +51,7 @@ static ViUInt32 receive(unsigned char *pBuf, ViUInt32 nSize) {
 }
 
 static void printText(const unsigned char *pBuf, ViUInt32 nLen) {
-  printf("  < \"%.*s\" (%lu bytes)\n", (int)nLen, (const char *)pBuf, (unsigned long)nLen);
+  printf("  < %.*s   (%lu bytes)\n", (int)nLen, (const char *)pBuf, (unsigned long)nLen);
 }
 
 /* Decodes "#<n><length><data>"; returns the data and its length, or NULL when malformed. */
