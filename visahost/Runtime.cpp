@@ -792,7 +792,7 @@ bool CRuntime::eventTypeKnown(const CObject &cSession, ViEventType nType) const 
 
 ViStatus CRuntime::enableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech,
                                ViEventFilter nContext) {
-  bool bFirst = false;
+  bool bAsk = false;
   {
     std::lock_guard<std::mutex> aGuard(m_aMutex);
     PObject pc = find(nVi);
@@ -808,23 +808,25 @@ ViStatus CRuntime::enableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech,
       if (!bInstalled) return VI_ERROR_HNDLR_NINSTALLED;
     }
     ViUInt16 nEnabled = pc->m_mapEnabled.count(nType) ? pc->m_mapEnabled[nType] : 0;
-    if ((nEnabled & nMech) == nMech) return VI_SUCCESS_EVENT_EN;
-    bFirst = nEnabled == 0;
+    // The passport hears the first enable of a type, which starts its event source, and an
+    // enable of what is already enabled, which it answers for itself; adding a further
+    // mechanism to an enabled type is the runtime's own business.
+    bAsk = nEnabled == 0 || (nEnabled & nMech) == nMech;
   }
-  // The passport starts its source when the event type becomes enabled at all, once.
-  if (bFirst) {
+  if (bAsk) {
     ViStatus nStatus = route<FEnableEvent>(nVi, "viEnableEvent", false, nType, nMech, nContext);
     if (nStatus < 0 && nStatus != VI_ERROR_NSUP_OPER) return nStatus;
   }
   std::lock_guard<std::mutex> aGuard(m_aMutex);
   PObject pc = find(nVi);
   if (!pc) return VI_ERROR_INV_OBJECT;
-  pc->m_mapEnabled[nType] |= nMech;
-  return VI_SUCCESS;
+  ViUInt16 nEnabled = pc->m_mapEnabled.count(nType) ? pc->m_mapEnabled[nType] : 0;
+  pc->m_mapEnabled[nType] = static_cast<ViUInt16>(nEnabled | nMech);
+  return (nEnabled & nMech) == nMech ? VI_SUCCESS_EVENT_EN : VI_SUCCESS;
 }
 
 ViStatus CRuntime::disableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech) {
-  std::vector<ViEventType> vStopped;
+  std::vector<ViEventType> vAsk;
   bool bAny = false;
   {
     std::lock_guard<std::mutex> aGuard(m_aMutex);
@@ -833,6 +835,11 @@ ViStatus CRuntime::disableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech
     if (pc->m_eKind != EKind::Session) return VI_ERROR_INV_EVENT;
     if (nType != VI_ALL_ENABLED_EVENTS && !eventTypeKnown(*pc, nType)) return VI_ERROR_INV_EVENT;
     if (!validMechanism(nMech, true)) return VI_ERROR_INV_MECH;
+    // The passport hears the disable that ends a type, which stops its event source, and the
+    // disable of a type that is not enabled, which it answers for itself.
+    if (nType != VI_ALL_ENABLED_EVENTS && !(pc->m_mapEnabled.count(nType) && (pc->m_mapEnabled[nType] & nMech))) {
+      vAsk.push_back(nType);
+    }
     for (auto it = pc->m_mapEnabled.begin(); it != pc->m_mapEnabled.end();) {
       if (nType != VI_ALL_ENABLED_EVENTS && it->first != nType) {
         ++it;
@@ -841,7 +848,7 @@ ViStatus CRuntime::disableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech
       bAny = bAny || (it->second & nMech) != 0;
       it->second = static_cast<ViUInt16>(it->second & ~nMech);
       if (it->second == 0) {
-        vStopped.push_back(it->first);
+        vAsk.push_back(it->first);
         it = pc->m_mapEnabled.erase(it);
       } else {
         ++it;
@@ -849,7 +856,7 @@ ViStatus CRuntime::disableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech
     }
   }
   ViStatus nResult = bAny ? VI_SUCCESS : VI_SUCCESS_EVENT_DIS;
-  for (ViEventType nStopped : vStopped) {
+  for (ViEventType nStopped : vAsk) {
     ViStatus nStatus = route<FDisableEvent>(nVi, "viDisableEvent", false, nStopped, nMech);
     if (nStatus < 0 && nStatus != VI_ERROR_NSUP_OPER) nResult = nStatus;
   }
