@@ -38,6 +38,14 @@ unsigned toWait(std::uint64_t timeoutMs)
                                                           : static_cast<unsigned>(timeoutMs);
 }
 
+// A notification runs on the event thread and must not fail there: without memory for the
+// message the waiting writer simply sees no answer and ends at its time-out.
+void logLostMessage(const CPmxSession* session)
+{
+    s_cLogger.error() << "LbPmxVisa::CPmxSession::notify" << " - " << "Could not create a message for session "
+                      << session;
+}
+
 } // namespace
 
 // The attribute fields start at the usual VISA defaults: END suppression off, END sent with
@@ -324,9 +332,11 @@ void CPmxSession::notifyCommandAcceptedEvent(const CPmxEvent&)
         void deliver() override {}
     };
     CPmxSessionMessage* message = new (std::nothrow) CPmxCommandAcceptedEventMessage();
-    if (message != 0) {
-        m_cMessageQueue.push(message, 0);
+    if (message == 0) {
+        logLostMessage(this);
+        return;
     }
+    m_cMessageQueue.push(message, 0);
 }
 
 void CPmxSession::notifyDataAvailableEvent(const CPmxEvent&)
@@ -345,9 +355,11 @@ void CPmxSession::notifyErrorOccuredEvent(const CPmxEvent& event)
         CPmxEvent m_cEvent;
     };
     CPmxSessionMessage* message = new (std::nothrow) CPmxCommandErrorEventMessage(event);
-    if (message != 0) {
-        m_cMessageQueue.push(message, 0);
+    if (message == 0) {
+        logLostMessage(this);
+        return;
     }
+    m_cMessageQueue.push(message, 0);
 }
 
 void CPmxSession::notifyStateChangedEvent(const CPmxEvent&) {}

@@ -92,11 +92,6 @@ public:
                                [&](const std::string& line) { return line.find(piece) != std::string::npos; });
         });
     }
-    void clear()
-    {
-        std::lock_guard<std::mutex> lock(m_cMutex);
-        m_cLines.clear();
-    }
 
 private:
     int m_nSavedLevel;
