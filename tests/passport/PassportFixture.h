@@ -121,7 +121,11 @@ public:
         setConfiguration("LOG_LEVEL", "DEBUG");
         setConfiguration("LOG_FILE", logPath().c_str());
         ViSession rm = VI_NULL;
-        ASSERT_EQ(VI_SUCCESS, viOpenDefaultRM(&rm));
+        ViStatus status = viOpenDefaultRM(&rm);
+        // Read once at load: later processes must not inherit this configuration.
+        setConfiguration("LOG_LEVEL", 0);
+        setConfiguration("LOG_FILE", 0);
+        ASSERT_EQ(VI_SUCCESS, status);
         viClose(rm);
     }
 
