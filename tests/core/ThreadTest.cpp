@@ -34,6 +34,7 @@ public:
     bool run() override
     {
         ++m_nRuns;
+        m_cInRun.open();
         if (m_bThrow) {
             throw std::runtime_error("run failed");
         }
@@ -54,6 +55,7 @@ public:
     }
 
     CQueue<CMessage> m_cQueue{2};
+    LbTests::CLatch m_cInRun; // open once run() was entered
     std::atomic<int> m_nInits{0};
     std::atomic<int> m_nRuns{0};
     std::atomic<int> m_nCleanups{0};
@@ -138,6 +140,7 @@ TEST_F(CThreadTest, StopWhileStoppingAndStartWhileStoppingReturnTwo)
     worker.m_bInterruptOnCleanup = false; // the worker stays blocked until the test lets it go
     CThread thread(worker);
     ASSERT_EQ(0, thread.start());
+    ASSERT_TRUE(worker.m_cInRun.waitOpen()); // a stop before the first run() would end it at once
     EXPECT_EQ(0, thread.stop());
     EXPECT_EQ(CThread::STATE_STOPPING, thread.getState());
     EXPECT_EQ(2, thread.stop());
@@ -225,6 +228,8 @@ TEST_F(CThreadTest, DestroyingARunningThreadWarnsAndEndsIt)
     {
         CThread thread(worker);
         ASSERT_EQ(0, thread.start());
+        // Blocked in pop, holding no lock: a forced end elsewhere could leave a lock taken.
+        ASSERT_TRUE(worker.m_cInRun.waitOpen());
     }
     EXPECT_TRUE(capture.contains("[WARN ] CThread - LbCore::CThread::~CThread - Thread has been not stopped safely"));
 }
