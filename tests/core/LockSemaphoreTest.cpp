@@ -72,23 +72,6 @@ TEST(CSemaphoreTest, CountsReleasesAndTimesOut)
     EXPECT_LT(waited, std::chrono::seconds(10));
 }
 
-TEST(CSemaphoreTest, HandsOffBetweenThreads)
-{
-    CSemaphore request(0);
-    CSemaphore answer(0);
-    std::thread peer([&] {
-        for (int i = 0; i < 1000; ++i) {
-            request.wait();
-            answer.release(1);
-        }
-    });
-    for (int i = 0; i < 1000; ++i) {
-        request.release(1);
-        ASSERT_TRUE(answer.wait(20000));
-    }
-    peer.join();
-}
-
 TEST(CSemaphoreTest, ReleasePastTheMaximumThrowsAndKeepsTheCount)
 {
     CSemaphore full(CSemaphore::MAX_COUNT);

@@ -4,7 +4,6 @@
 
 #include <atomic>
 #include <mutex>
-#include <sstream>
 #include <thread>
 #include <vector>
 
@@ -58,15 +57,4 @@ TEST(CMemoryPoolTest, ManagedObjectsComeAndGoFromSeveralThreads)
         delete managed;
     }
     EXPECT_EQ(0, g_nAlive.load());
-}
-
-TEST(CMemoryPoolTest, PoolIsOneInstanceAndReportsNothing)
-{
-    EXPECT_EQ(&CMemoryPool::getInstance(), &CMemoryPool::getInstance());
-    void* block = CMemoryPool::getInstance().allocate(0);
-    EXPECT_NE(nullptr, block);
-    CMemoryPool::getInstance().free(block);
-    std::ostringstream report;
-    CMemoryPool::getInstance().report(report);
-    EXPECT_EQ("", report.str());
 }

@@ -114,23 +114,6 @@ TEST(CSubjectTest, DisableStopsAWalkInProgressBeforeTheNextObserver)
     EXPECT_TRUE(subject.attach(second));
 }
 
-TEST(CSubjectTest, VoidSubjectWalksAndStopsTheSameWay)
-{
-    struct CCounter {
-        void add(int value) { m_nSum += value; }
-        int m_nSum = 0;
-    } a, b;
-    CSubject<CCounter, void(int)> subject(&CCounter::add);
-    subject.attach(a);
-    subject.attach(b);
-    subject.notify(3);
-    EXPECT_EQ(3, a.m_nSum);
-    EXPECT_EQ(3, b.m_nSum);
-    subject.disable();
-    subject.notify(3);
-    EXPECT_EQ(3, a.m_nSum);
-}
-
 TEST(CParentTest, NullParentThrows)
 {
     int owner = 4;
