@@ -137,15 +137,9 @@ void CPmxSession::write(const std::string& command)
             }
             clearMessages(session.m_cMessageQueue);
             ++session.m_nCommandCount;
-            session.changeState(CIPmxSessionState::noData());
-            CPmxSessionDispatcher* dispatcher = session.getParent();
-            dispatcher->callChecked(&CIPmxCommands::emptyAllBuffers, session);
-            s_cLogger.debug() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
-                              << "Execute PmxSendCommand(...) [" << m_sText << "] for session " << &session;
-            dispatcher->callChecked(&CIPmxCommands::sendCommand, session, m_sText);
-
-            // Answers of earlier commands that were never accounted for are purged, so the
-            // answer awaited below belongs to this command.
+            // Answers of earlier commands that were never accounted for are purged before this
+            // command is sent: purging after the send would throw away this command's own
+            // answer when the sensor answers at once, and the writer would wait in vain.
             int result = CMessageQueue::RESULT_ITEM;
             while (session.m_nMessageCount + 1 < session.m_nCommandCount && result == CMessageQueue::RESULT_ITEM) {
                 s_cLogger.warn() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
@@ -159,6 +153,13 @@ void CPmxSession::write(const std::string& command)
                 }
                 ++session.m_nMessageCount;
             }
+
+            session.changeState(CIPmxSessionState::noData());
+            CPmxSessionDispatcher* dispatcher = session.getParent();
+            dispatcher->callChecked(&CIPmxCommands::emptyAllBuffers, session);
+            s_cLogger.debug() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
+                              << "Execute PmxSendCommand(...) [" << m_sText << "] for session " << &session;
+            dispatcher->callChecked(&CIPmxCommands::sendCommand, session, m_sText);
 
             CPmxSessionMessage* message = 0;
             if (session.m_cMessageQueue.pop(message, toWait(session.m_nTimeout)) != CMessageQueue::RESULT_ITEM) {

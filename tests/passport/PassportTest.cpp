@@ -159,8 +159,11 @@ TEST_F(Sessions, ASecondCommandWhileOneWaitsIsRefusedAtOnce)
     writer.join();
     ASSERT_EQ(0, PmxSimSetAutoAck(1));
     std::size_t purged = logCount("Asynchronous Message detected! Will be deleted to ensure stable further working!");
+    std::size_t missed = logCount("No message arrived for session");
     EXPECT_EQ(VI_SUCCESS, write(other, "*RST"));
     EXPECT_EQ(purged + 1, logCount("Asynchronous Message detected! Will be deleted to ensure stable further working!"));
+    // The purge of the failed command's answer does not swallow this command's acknowledgement.
+    EXPECT_EQ(missed, logCount("No message arrived for session"));
 }
 
 TEST_F(Sessions, AtMost128SensorSessions)
