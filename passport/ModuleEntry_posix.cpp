@@ -1,6 +1,8 @@
-// Module entry on POSIX: the module's ELF constructor and destructor stand for process attach
-// and detach. This file is linked after every library of the module, so its constructor runs
-// after all static objects are built and its destructor before they go.
+// Module entry on POSIX: the construction and destruction of one static object stand for process
+// attach and detach. This file is linked after every library of the module, so the object is
+// built after all other static objects of the module; being registered after them, it is also
+// destroyed before them, whether the module is unloaded or the process exits (exit() destroys
+// static objects before it runs plain ELF destructor functions, so those would come too late).
 //
 // Configuration: the environment variables LBVIPMX_LOG_LEVEL and LBVIPMX_LOG_FILE stand for the
 // registry values LOG_LEVEL and LOG_FILE, with the same texts and the same 80-byte limit
@@ -31,15 +33,12 @@ bool queryConfigurationValue(const char* name, char (&buffer)[80], unsigned& siz
 namespace {
 // A failed attach cannot refuse the load here; without a vector table the runtime never routes
 // an operation to the passport, so a failed attach leaves it inert.
-__attribute__((constructor)) void processAttach()
-{
-    attachProcess();
-}
+struct CModuleEntry {
+    CModuleEntry() { attachProcess(); }
+    ~CModuleEntry() { detachProcess(); }
+};
 
-__attribute__((destructor)) void processDetach()
-{
-    detachProcess();
-}
+CModuleEntry s_cModuleEntry;
 } // namespace
 
 } // namespace LbPmxPassport
