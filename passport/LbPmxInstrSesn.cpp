@@ -345,6 +345,19 @@ ViStatus CLbPmxInstrSesn::viGetAttribute(ViAttr attribute, void* value)
     if (value == 0) {
         return VI_ERROR_INV_PARAMETER;
     }
+    // The version information of the module may be unreadable; no exception leaves the passport.
+    try {
+        return getAttribute(attribute, value);
+    } catch (const std::exception& e) {
+        s_cLogger.error() << "LbPmxPassport::CLbPmxInstrSesn::viGetAttribute" << " - " << e.what();
+    } catch (...) {
+        s_cLogger.error() << "LbPmxPassport::CLbPmxInstrSesn::viGetAttribute" << " - " << "Unknown exception...";
+    }
+    return VI_ERROR_SYSTEM_ERROR;
+}
+
+ViStatus CLbPmxInstrSesn::getAttribute(ViAttr attribute, void* value)
+{
     CPmxSession& session = *m_pcSession;
     CPmxSessionDispatcher& dispatcher = CPmxSessionDispatcher::getInstance();
     switch (attribute) {

@@ -92,6 +92,7 @@ public:
     static constexpr unsigned MAX_ACTIVE_SESSIONS = 127;
 
 private:
+    ViStatus getAttribute(ViAttr attribute, void* value);
     ViStatus enableListener(ViEventType type, bool enable);
     LbPmxVisa::CIPmxEventListener* listenerFor(ViEventType type);
 
