@@ -25,6 +25,10 @@ if [ ! -d "$WINEPREFIX" ]; then
   echo "== creating the Wine prefix"
   wineboot -i >/dev/null 2>&1 || wine wineboot -i >/dev/null 2>&1 || true
 fi
+# One persistent Wine server for the whole run, started here with its output detached: a server
+# started by the first Windows test would inherit that test's output pipes and make CTest wait.
+wineserver -p >/dev/null 2>&1 </dev/null || true
+trap 'wineserver -k >/dev/null 2>&1 || true' EXIT
 
 for preset in dev tsan asan mingw; do
   echo "== $preset"
