@@ -147,12 +147,18 @@ std::int32_t CPmxControl::getDeviceInfo(std::int32_t index, std::string& name, s
     return result;
 }
 
+// Runs on the library's own thread, inside the library's callback: an exception must not
+// unwind into the library, where nothing would catch it and the process would end. A listener
+// that fails (only when memory runs out in the system's own listeners) loses that one event.
 void CPmxControl::forward(PmxNotification notification, std::int64_t handle, std::int32_t value)
 {
     CIPmxEventListener* listener = m_pcListener;
     if (listener != nullptr) {
         CPmxEvent event = { handle, value };
-        (listener->*notification)(event);
+        try {
+            (listener->*notification)(event);
+        } catch (...) {
+        }
     }
 }
 

@@ -13,6 +13,7 @@
 #include <condition_variable>
 #include <cstdint>
 #include <mutex>
+#include <stdexcept>
 #include <string>
 #include <thread>
 #include <vector>
@@ -182,6 +183,30 @@ TEST_F(PmxControlTest, OpenDriverInstallsCallbacksThatForwardOnTheLibraryThread)
 
     ASSERT_EQ(0, m_cControl.closeDriver());
     EXPECT_FALSE(m_cControl.isDriverOpen());
+}
+
+// A listener that fails on the library's thread must not take the library (and the process)
+// down: the adapter keeps the exception out of the callback and the next event still arrives.
+TEST_F(PmxControlTest, ListenerFailureStaysOutOfTheLibraryThread)
+{
+    class CThrowing : public CRecorder {
+    public:
+        void notifyErrorOccuredEvent(const CPmxEvent& event) override
+        {
+            if (event.value == 0x2222) {
+                throw std::runtime_error("listener failed");
+            }
+            CRecorder::notifyErrorOccuredEvent(event);
+        }
+    } throwing;
+    m_cControl.setEventListener(&throwing);
+    ASSERT_EQ(0, m_cControl.openDriver());
+    ASSERT_EQ(0, PmxSimReportError("", 0x2222));
+    ASSERT_EQ(0, PmxSimReportError("", 0x3333));
+    ASSERT_TRUE(throwing.waitCount(1));
+    std::vector<SNote> expected = {{"error", 0, 0x3333}};
+    EXPECT_EQ(expected, throwing.notes());
+    ASSERT_EQ(0, m_cControl.closeDriver());
 }
 
 TEST_F(PmxControlTest, FailedCloseDriverStaysOpenWithCallbacksRemoved)
