@@ -836,8 +836,9 @@ ViStatus CRuntime::disableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech
     if (nType != VI_ALL_ENABLED_EVENTS && !eventTypeKnown(*pc, nType)) return VI_ERROR_INV_EVENT;
     if (!validMechanism(nMech, true)) return VI_ERROR_INV_MECH;
     // The passport hears the disable that ends a type, which stops its event source, and the
-    // disable of a type that is not enabled, which it answers for itself.
-    if (nType != VI_ALL_ENABLED_EVENTS && !(pc->m_mapEnabled.count(nType) && (pc->m_mapEnabled[nType] & nMech))) {
+    // disable of a type that is not enabled at all, which it answers for itself. A mechanism
+    // that is not enabled on an enabled type leaves the passport's source running.
+    if (nType != VI_ALL_ENABLED_EVENTS && !pc->m_mapEnabled.count(nType)) {
       vAsk.push_back(nType);
     }
     for (auto it = pc->m_mapEnabled.begin(); it != pc->m_mapEnabled.end();) {

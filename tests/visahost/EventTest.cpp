@@ -166,6 +166,16 @@ TEST_F(Events, RepeatedEnableAndDisableAreAnsweredByThePassport) {
   EXPECT_EQ(VI_ERROR_NENABLED, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
 }
 
+TEST_F(Events, DisablingAMechanismThatIsNotEnabledKeepsTheOthers) {
+  ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+  EXPECT_EQ(VI_SUCCESS_EVENT_DIS, viDisableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_HNDLR));
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
+  EXPECT_EQ(VI_SUCCESS, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
+  // The passport still counts the type as enabled: only the disable that ends it reaches it.
+  EXPECT_EQ(VI_SUCCESS, viDisableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE));
+  EXPECT_EQ(VI_ERROR_SYSTEM_ERROR, viDisableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE));
+}
+
 TEST_F(Events, WrongTypesAndMechanisms) {
   EXPECT_EQ(VI_ERROR_INV_EVENT, viEnableEvent(m_nVi, VI_EVENT_TRIG, VI_QUEUE, VI_NULL));
   EXPECT_EQ(VI_ERROR_INV_EVENT, viEnableEvent(m_nVi, VI_ALL_ENABLED_EVENTS, VI_QUEUE, VI_NULL));
