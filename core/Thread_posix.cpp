@@ -3,6 +3,7 @@
 #include "core/Log.h"
 #include "core/ThreadPlatform.h"
 
+#include <new>
 #include <pthread.h>
 
 namespace LbCore {
@@ -28,7 +29,12 @@ void* trampoline(void* start)
 
 bool create(unsigned (*entry)(void*), void* argument, void*& handle, std::uint32_t& id)
 {
-    CStart* start = new CStart{entry, argument};
+    // Without memory for the start record no thread can be made: reported like any failed
+    // creation, so start() returns to idle instead of throwing with the state left running.
+    CStart* start = new (std::nothrow) CStart{entry, argument};
+    if (start == 0) {
+        return false;
+    }
     pthread_t thread;
     if (pthread_create(&thread, 0, &trampoline, start) != 0) {
         delete start;

@@ -2,6 +2,7 @@
 
 #include "core/ThreadPlatform.h"
 
+#include <new>
 #include <process.h>
 #include <windows.h>
 
@@ -25,7 +26,12 @@ unsigned __stdcall trampoline(void* start)
 
 bool create(unsigned (*entry)(void*), void* argument, void*& handle, std::uint32_t& id)
 {
-    CStart* start = new CStart{entry, argument};
+    // Without memory for the start record no thread can be made: reported like any failed
+    // creation, so start() returns to idle instead of throwing with the state left running.
+    CStart* start = new (std::nothrow) CStart{entry, argument};
+    if (start == 0) {
+        return false;
+    }
     unsigned threadId = 0;
     uintptr_t result = _beginthreadex(0, 0, &trampoline, start, 0, &threadId);
     if (result == 0) {
