@@ -12,6 +12,10 @@ namespace LbPmxVisa {
 
 static LbCore::CLogger s_cLogger = LbCore::CLogManager::getLogger("CPmxEventDispatcher");
 
+namespace {
+const unsigned CLEANUP_WAIT_MS = 10000;
+}
+
 // ---- CPmxEventMessage
 
 CPmxEventDispatcher::CPmxEventMessage::CPmxEventMessage(CPmxEventDispatcher* dispatcher, const CPmxEvent& event,
@@ -31,6 +35,13 @@ CPmxEventDispatcher::CPmxEventMessage::~CPmxEventMessage()
 
 void CPmxEventDispatcher::CPmxEventMessage::execute(const LbCore::CThread&)
 {
+    // The worker ends only after a stop, whose cleanup() runs on the stopping thread: wait until
+    // it has logged, so the lines keep their order. Bounded, so that an end without a stop
+    // cannot hang the worker; the count is handed on to the next message.
+    CPmxEventDispatcher* dispatcher = getParent();
+    if (dispatcher->m_cCleanedUp.wait(CLEANUP_WAIT_MS)) {
+        dispatcher->m_cCleanedUp.release(1);
+    }
     s_cLogger.debug() << "LbPmxVisa::CPmxEventDispatcher::CPmxEventMessage::execute" << " - "
                       << "Shutdown CPmxEventDispatcher ";
     getParent()->m_cListeners.disable();
@@ -46,7 +57,8 @@ void CPmxEventDispatcher::CPmxEventMessage::deliver()
 // ---- CPmxEventDispatcher
 
 CPmxEventDispatcher::CPmxEventDispatcher(CPmxSession* session)
-    : LbCore::CParent<CPmxSession>(session), m_cWorker(*this), m_cListeners(), m_cQueue(2), m_bShutDown(false)
+    : LbCore::CParent<CPmxSession>(session), m_cWorker(*this), m_cListeners(), m_cQueue(2), m_bShutDown(false),
+      m_cCleanedUp(0)
 {
     if (m_cWorker.start() != LbCore::CThread::RESULT_DONE) {
         {
@@ -156,6 +168,7 @@ void CPmxEventDispatcher::cleanup()
     m_cQueue.interrupt();
     m_cListeners.disable();
     s_cLogger.debug() << "LbPmxVisa::CPmxEventDispatcher::cleanup" << " - " << "Queue interrupt(...) ";
+    m_cCleanedUp.release(1);
 }
 
 } // namespace LbPmxVisa

@@ -10,6 +10,7 @@
 #include "core/MemoryPool.h"
 #include "core/Parent.h"
 #include "core/Queue.h"
+#include "core/Semaphore.h"
 #include "core/Subject.h"
 #include "core/Thread.h"
 #include "sensor/PmxCommands.h"
@@ -63,6 +64,8 @@ private:
     LbCore::CSubject<CIPmxEventListener, void(const CPmxEvent&)> m_cListeners;
     LbCore::CQueue<CPmxEventMessage> m_cQueue;
     std::atomic<bool> m_bShutDown;
+    // Released once cleanup() has logged, so that the worker's shutdown lines come after it.
+    LbCore::CSemaphore m_cCleanedUp;
 };
 
 } // namespace LbPmxVisa
