@@ -123,6 +123,18 @@ CLbPmxInstrSesn::~CLbPmxInstrSesn()
         m_nClosingFromDestructor = 1;
         viClose();
     }
+    // The event worker may be delivering to a listener right now. Unsubscribing all three while
+    // they are still whole waits for such a delivery; left to the listeners' own destructors,
+    // the worker could call one whose most derived part is already gone.
+    try {
+        if (m_pcSession) {
+            LbPmxVisa::CPmxEventDispatcher& events = m_pcSession->getEventDispatcher();
+            events.removeListener(&m_cExceptionListener);
+            events.removeListener(&m_cUsbListener);
+            events.removeListener(&m_cSrqListener);
+        }
+    } catch (...) {
+    }
 }
 
 void CLbPmxInstrSesn::setVisaSession(ViSession session, ViAddr* record)

@@ -270,4 +270,21 @@ TEST_F(Events, RaisedOnTheSessionsThatEnabledThemOnly)
     EXPECT_EQ(128 + 4, stb);
 }
 
+TEST_F(Events, SessionsCloseWhileTheirListenersAreBeingCalled)
+{
+    // One session keeps the sensor session alive; others enable events and close while the
+    // event worker delivers to them. A listener must never be called while it is being destroyed.
+    ViSession keeper = open(SENSOR);
+    ASSERT_EQ(0, PmxSimSetDelays(0, 1));
+    ASSERT_EQ(VI_SUCCESS, write(keeper, "init:cont on"));
+    for (int i = 0; i < 100; ++i) {
+        ViSession session = open(SENSOR);
+        ASSERT_EQ(VI_SUCCESS, viEnableEvent(session, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+        ASSERT_EQ(VI_SUCCESS, viEnableEvent(session, VI_EVENT_EXCEPTION, VI_QUEUE, VI_NULL));
+        ASSERT_EQ(0, PmxSimReportError("100000", 0x55));
+        ASSERT_EQ(VI_SUCCESS, viClose(session));
+    }
+    EXPECT_EQ(VI_SUCCESS, write(keeper, "init:cont off"));
+}
+
 } // namespace LbPassportTest
