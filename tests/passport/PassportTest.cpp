@@ -284,7 +284,6 @@ TEST_F(Events, SessionsCloseWhileTheirListenersAreBeingCalled)
         ASSERT_EQ(0, PmxSimReportError("100000", 0x55));
         ASSERT_EQ(VI_SUCCESS, viClose(session));
     }
-    EXPECT_EQ(VI_SUCCESS, write(keeper, "init:cont off"));
 }
 
 } // namespace LbPassportTest
