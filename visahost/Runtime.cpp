@@ -6,6 +6,7 @@
 #include <chrono>
 #include <cstdio>
 #include <cstring>
+#include <thread>
 
 #include "visahost/Module.h"
 #include "visahost/RsrcExpr.h"
@@ -360,8 +361,10 @@ ViStatus CRuntime::createEvent(ViSession nVi, ViEventType nType, ViEvent *pnCont
 }
 
 ViStatus CRuntime::raiseEvent(ViSession nVi, ViEvent nContext, ViUInt32 nMech) {
-  std::vector<SHandler> vHandlers;
   ViEventType nType = 0;
+  bool bHandlers = false;
+  bool bQueued = false;
+  ViStatus nResult = VI_SUCCESS;
   {
     std::lock_guard<std::mutex> aGuard(m_aMutex);
     PObject pc = find(nVi);
@@ -371,28 +374,64 @@ ViStatus CRuntime::raiseEvent(ViSession nVi, ViEvent nContext, ViUInt32 nMech) {
       return VI_ERROR_INV_CONTEXT;
     nType = pcEvent->m_nEventType;
     if (nMech & VI_HNDLR) {
-      // The most recently installed handler is called first.
-      for (auto it = pc->m_vHandlers.rbegin(); it != pc->m_vHandlers.rend(); ++it)
-        if (it->m_nType == nType) vHandlers.push_back(*it);
+      for (const SHandler &s : pc->m_vHandlers) bHandlers = bHandlers || s.m_nType == nType;
+    }
+    if ((nMech & VI_QUEUE) && !pc->m_bClosing) {
+      if (pc->m_dqQueue.size() >= pc->m_nMaxQueue) {
+        // A full queue keeps the events it holds; the new one is lost.
+        nResult = VI_ERROR_QUEUE_OVERFLOW;
+      } else {
+        pc->m_dqQueue.push_back(nContext);
+        pc->m_cvChanged.notify_all();
+        bQueued = true;
+      }
+    }
+    if (!bHandlers && !bQueued) erase(nContext);
+  }
+  if (bHandlers) postHandlers(SHandlerJob{nVi, nType, nContext, bQueued});
+  return nResult;
+}
+
+void CRuntime::postHandlers(const SHandlerJob &sJob) {
+  std::lock_guard<std::mutex> aGuard(m_aHandlerMutex);
+  m_dqHandlerJobs.push_back(sJob);
+  m_cvHandlerJobs.notify_one();
+  if (!m_bHandlerThread) {
+    // Lives as long as the runtime, which is never destroyed.
+    m_bHandlerThread = true;
+    std::thread([this] { runHandlers(); }).detach();
+  }
+}
+
+void CRuntime::runHandlers() {
+  for (;;) {
+    SHandlerJob sJob;
+    {
+      std::unique_lock<std::mutex> aLock(m_aHandlerMutex);
+      m_cvHandlerJobs.wait(aLock, [this] { return !m_dqHandlerJobs.empty(); });
+      sJob = m_dqHandlerJobs.front();
+      m_dqHandlerJobs.pop_front();
+    }
+    // The handlers installed now, the most recently installed first.
+    std::vector<SHandler> vHandlers;
+    {
+      std::lock_guard<std::mutex> aGuard(m_aMutex);
+      PObject pc = find(sJob.m_nVi);
+      if (pc && !pc->m_bClosing) {
+        for (auto it = pc->m_vHandlers.rbegin(); it != pc->m_vHandlers.rend(); ++it)
+          if (it->m_nType == sJob.m_nType) vHandlers.push_back(*it);
+      }
+    }
+    for (const SHandler &sHandler : vHandlers)
+      if (sHandler.m_pfHandler(sJob.m_nVi, sJob.m_nType, sJob.m_nContext, sHandler.m_pUser) ==
+          VI_SUCCESS_NCHAIN)
+        break;
+    if (!sJob.m_bQueued) {
+      // Delivered to the handlers only: its context ends with them.
+      std::lock_guard<std::mutex> aGuard(m_aMutex);
+      if (find(sJob.m_nContext)) erase(sJob.m_nContext);
     }
   }
-  for (const SHandler &sHandler : vHandlers)
-    if (sHandler.m_pfHandler(nVi, nType, nContext, sHandler.m_pUser) == VI_SUCCESS_NCHAIN) break;
-  std::lock_guard<std::mutex> aGuard(m_aMutex);
-  PObject pc = find(nVi);
-  bool bQueue = (nMech & VI_QUEUE) && pc && !pc->m_bClosing && find(nContext);
-  if (bQueue && pc->m_dqQueue.size() >= pc->m_nMaxQueue) {
-    // A full queue keeps the events it holds; the new one is lost.
-    erase(nContext);
-    return VI_ERROR_QUEUE_OVERFLOW;
-  }
-  if (!bQueue) {
-    erase(nContext);  // delivered to the handlers only: its context ends with them
-    return VI_SUCCESS;
-  }
-  pc->m_dqQueue.push_back(nContext);
-  pc->m_cvChanged.notify_all();
-  return VI_SUCCESS;
 }
 
 ViStatus CRuntime::installTable(ViSession nVi, ViSvcHandle hTable) {

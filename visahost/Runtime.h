@@ -7,7 +7,8 @@
 // - Passports are loaded on the first viOpenDefaultRM; their entry runs during the load and
 //   may call every service. Vector tables are routing targets in the order they were created.
 // - Calls into passports and event handlers are made without holding the runtime's mutex, so
-//   passports may call services (and handlers VISA operations) from within them.
+//   passports may call services (and handlers VISA operations) from within them. Handlers run
+//   in order on one thread of the runtime's own, not on the thread that raised the event.
 // - viClose of a session waits until calls on it from other threads have returned, so a
 //   passport never sees an operation on a session it has already closed.
 // - The object lives until the process ends (it is never destroyed), so passports may call
@@ -156,7 +157,21 @@ class CRuntime {
   std::map<std::string, std::unique_ptr<CSvcLock>> m_mapLocks;
   std::map<std::string, SRsrcLock> m_mapRsrcLocks;
   unsigned m_nKeys = 0;
-  unsigned m_nDetaches = 0;
+
+  // Event handlers run on a thread of the runtime's own, never on the passport's thread that
+  // raised the event: a handler may then call any VISA operation, viClose of its session included.
+  struct SHandlerJob {
+    ViSession m_nVi;
+    ViEventType m_nType;
+    ViEvent m_nContext;
+    bool m_bQueued;  // the context also went to the session's queue and outlives the handlers
+  };
+  void postHandlers(const SHandlerJob &sJob);
+  void runHandlers();
+  std::mutex m_aHandlerMutex;
+  std::condition_variable m_cvHandlerJobs;
+  std::deque<SHandlerJob> m_dqHandlerJobs;
+  bool m_bHandlerThread = false;
 };
 
 // Text for a status; false when the status is unknown.

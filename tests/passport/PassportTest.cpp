@@ -3,6 +3,9 @@
 #include "tests/passport/PassportFixture.h"
 
 #include <atomic>
+#include <chrono>
+#include <condition_variable>
+#include <mutex>
 #include <cstring>
 #include <thread>
 
@@ -284,6 +287,43 @@ TEST_F(Events, SessionsCloseWhileTheirListenersAreBeingCalled)
         ASSERT_EQ(0, PmxSimReportError("100000", 0x55));
         ASSERT_EQ(VI_SUCCESS, viClose(session));
     }
+}
+
+namespace {
+struct CClosingHandler {
+    std::mutex mutex;
+    std::condition_variable done;
+    bool called = false;
+    ViStatus status = VI_ERROR_SYSTEM_ERROR;
+};
+
+ViStatus _VI_FUNCH closeFromHandler(ViSession session, ViEventType, ViEvent, ViAddr user)
+{
+    CClosingHandler* handler = static_cast<CClosingHandler*>(user);
+    ViStatus status = viClose(session);
+    std::lock_guard<std::mutex> lock(handler->mutex);
+    handler->status = status;
+    handler->called = true;
+    handler->done.notify_all();
+    return VI_SUCCESS;
+}
+} // namespace
+
+TEST_F(Events, AHandlerMayCloseTheLastSessionOfItsSensor)
+{
+    ViSession session = open(SENSOR);
+    CClosingHandler handler;
+    ASSERT_EQ(VI_SUCCESS, viInstallHandler(session, VI_EVENT_SERVICE_REQ, closeFromHandler, &handler));
+    ASSERT_EQ(VI_SUCCESS, viEnableEvent(session, VI_EVENT_SERVICE_REQ, VI_HNDLR, VI_NULL));
+    ASSERT_EQ(0, PmxSimSetTriggerState("100000", 3));
+    {
+        std::unique_lock<std::mutex> lock(handler.mutex);
+        ASSERT_TRUE(handler.done.wait_for(lock, std::chrono::seconds(30), [&] { return handler.called; }));
+    }
+    EXPECT_EQ(VI_SUCCESS, handler.status);
+    // The sensor session went with its last VISA session; the sensor opens again.
+    ViSession again = open(SENSOR);
+    EXPECT_EQ(VI_SUCCESS, viClose(again));
 }
 
 } // namespace LbPassportTest

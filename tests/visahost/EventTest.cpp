@@ -1,6 +1,8 @@
 // Events raised by the test passport (a write "EVENT n" raises n service requests) and their
 // delivery through the VISA queue and handlers.
 #include <chrono>
+#include <condition_variable>
+#include <mutex>
 #include <thread>
 #include <vector>
 
@@ -86,33 +88,63 @@ TEST_F(Events, ClosingTheSessionEndsAWait) {
   EXPECT_EQ(VI_ERROR_INV_OBJECT, nStatus);
 }
 
+// What the handlers saw; they run on the runtime's handler thread, so the test waits for them.
 struct SCalls {
+  std::mutex m_aMutex;
+  std::condition_variable m_cvCalled;
   std::vector<int> m_vOrder;
   ViSession m_nVi = 0;
   ViEventType m_nType = 0;
   ViEvent m_nContext = 0;
   ViStatus m_nContextStatus = VI_ERROR_SYSTEM_ERROR;
+
+  void called(int nHandler) {
+    std::lock_guard<std::mutex> aGuard(m_aMutex);
+    m_vOrder.push_back(nHandler);
+    m_cvCalled.notify_all();
+  }
+  // The calls once there are nCount of them (or what there is after a generous deadline).
+  std::vector<int> order(size_t nCount) {
+    std::unique_lock<std::mutex> aLock(m_aMutex);
+    m_cvCalled.wait_for(aLock, std::chrono::seconds(30), [&] { return m_vOrder.size() >= nCount; });
+    std::vector<int> v = m_vOrder;
+    m_vOrder.clear();
+    return v;
+  }
 };
 
 ViStatus _VI_FUNCH firstHandler(ViSession vi, ViEventType type, ViEvent context, ViAddr user) {
   auto *ps = static_cast<SCalls *>(user);
-  ps->m_vOrder.push_back(1);
-  ps->m_nVi = vi;
-  ps->m_nType = type;
-  ps->m_nContext = context;
   ViEventType nType = 0;
-  ps->m_nContextStatus = viGetAttribute(context, VI_ATTR_EVENT_TYPE, &nType);
+  ViStatus nStatus = viGetAttribute(context, VI_ATTR_EVENT_TYPE, &nType);
+  {
+    std::lock_guard<std::mutex> aGuard(ps->m_aMutex);
+    ps->m_nVi = vi;
+    ps->m_nType = type;
+    ps->m_nContext = context;
+    ps->m_nContextStatus = nStatus;
+  }
+  ps->called(1);
   return VI_SUCCESS;
 }
 
 ViStatus _VI_FUNCH secondHandler(ViSession, ViEventType, ViEvent, ViAddr user) {
-  static_cast<SCalls *>(user)->m_vOrder.push_back(2);
+  static_cast<SCalls *>(user)->called(2);
   return VI_SUCCESS;
 }
 
 ViStatus _VI_FUNCH stopHandler(ViSession, ViEventType, ViEvent, ViAddr user) {
-  static_cast<SCalls *>(user)->m_vOrder.push_back(3);
+  static_cast<SCalls *>(user)->called(3);
   return VI_SUCCESS_NCHAIN;
+}
+
+// Closes the session it is called for: allowed, since handlers do not run on the thread that
+// raised the event.
+ViStatus _VI_FUNCH closingHandler(ViSession vi, ViEventType, ViEvent, ViAddr user) {
+  auto *ps = static_cast<SCalls *>(user);
+  ps->m_nContextStatus = viClose(vi);
+  ps->called(4);
+  return VI_SUCCESS;
 }
 
 TEST_F(Events, HandlersAreCalledNewestFirst) {
@@ -122,18 +154,19 @@ TEST_F(Events, HandlersAreCalledNewestFirst) {
   ASSERT_EQ(VI_SUCCESS, viInstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, secondHandler, &sCalls));
   ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_HNDLR, VI_NULL));
   ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
-  EXPECT_EQ((std::vector<int>{2, 1}), sCalls.m_vOrder);
+  EXPECT_EQ((std::vector<int>{2, 1}), sCalls.order(2));
   EXPECT_EQ(m_nVi, sCalls.m_nVi);
   EXPECT_EQ(static_cast<ViEventType>(VI_EVENT_SERVICE_REQ), sCalls.m_nType);
   EXPECT_EQ(VI_SUCCESS, sCalls.m_nContextStatus);  // valid while the handler runs
-  EXPECT_EQ(VI_ERROR_INV_OBJECT, viClose(sCalls.m_nContext));  // and closed after it
   // Nothing went to the queue, which was not enabled.
   EXPECT_EQ(VI_ERROR_NENABLED, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
 
-  sCalls.m_vOrder.clear();
   ASSERT_EQ(VI_SUCCESS, viInstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, stopHandler, &sCalls));
   ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
-  EXPECT_EQ((std::vector<int>{3}), sCalls.m_vOrder);
+  EXPECT_EQ((std::vector<int>{3}), sCalls.order(1));
+  // The context of an event delivered to handlers only ends with them.
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
+  EXPECT_EQ((std::vector<int>{3}), sCalls.order(1));
 
   EXPECT_EQ(VI_SUCCESS, viUninstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, stopHandler, &sCalls));
   EXPECT_EQ(VI_ERROR_INV_HNDLR_REF, viUninstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, stopHandler, &sCalls));
@@ -148,8 +181,18 @@ TEST_F(Events, QueueAndHandlerTogether) {
   ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_HNDLR, VI_NULL));
   ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
   ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
-  EXPECT_EQ((std::vector<int>{2}), sCalls.m_vOrder);
+  EXPECT_EQ((std::vector<int>{2}), sCalls.order(1));
   EXPECT_EQ(VI_SUCCESS, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
+}
+
+TEST_F(Events, AHandlerMayCloseItsOwnSession) {
+  SCalls sCalls;
+  ASSERT_EQ(VI_SUCCESS, viInstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, closingHandler, &sCalls));
+  ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_HNDLR, VI_NULL));
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
+  EXPECT_EQ((std::vector<int>{4}), sCalls.order(1));
+  EXPECT_EQ(VI_SUCCESS, sCalls.m_nContextStatus);
+  EXPECT_EQ(VI_ERROR_INV_OBJECT, write(m_nVi, "EVENT 1"));
 }
 
 TEST_F(Events, RepeatedEnableAndDisableAreAnsweredByThePassport) {
