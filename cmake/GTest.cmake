@@ -27,6 +27,11 @@ function(lb_add_test name)
   add_executable(${name} ${T_SOURCES})
   target_link_libraries(${name} PRIVATE ${T_LIBS} GTest::gmock GTest::gtest_main Threads::Threads)
   add_test(NAME ${name} COMMAND ${name})
-  set_tests_properties(${name} PROPERTIES TIMEOUT 600
+  if(CMAKE_CROSSCOMPILING)
+    set(_lb_timeout 180)
+  else()
+    set(_lb_timeout 600)
+  endif()
+  set_tests_properties(${name} PROPERTIES TIMEOUT ${_lb_timeout}
     ENVIRONMENT "WINEDEBUG=-all;TSAN_OPTIONS=halt_on_error=1:second_deadlock_stack=1;ASAN_OPTIONS=detect_leaks=1:halt_on_error=1;UBSAN_OPTIONS=halt_on_error=1:print_stacktrace=1")
 endfunction()
