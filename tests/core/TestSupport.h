@@ -22,10 +22,18 @@ public:
         m_bOpen = true;
         m_cCondition.notify_all();
     }
-    bool waitOpen()
+    bool waitOpen() { return waitOpenFor(kDeadline); }
+    // For checks that something has NOT happened yet: a short, bounded look.
+    template <class Duration>
+    bool waitOpenFor(Duration wait)
     {
         std::unique_lock<std::mutex> lock(m_cMutex);
-        return m_cCondition.wait_for(lock, kDeadline, [this] { return m_bOpen; });
+        return m_cCondition.wait_for(lock, wait, [this] { return m_bOpen; });
+    }
+    bool isOpen()
+    {
+        std::lock_guard<std::mutex> lock(m_cMutex);
+        return m_bOpen;
     }
 
 private:
@@ -47,6 +55,7 @@ public:
     {
         std::lock_guard<std::mutex> lock(m_cMutex);
         m_cLines.push_back(message.getText());
+        m_cCondition.notify_all();
         return true;
     }
     std::vector<std::string> lines()
@@ -54,19 +63,37 @@ public:
         std::lock_guard<std::mutex> lock(m_cMutex);
         return m_cLines;
     }
-    bool contains(const std::string& piece)
+    // Lines that contain the piece, in order.
+    std::vector<std::string> matching(const std::string& piece)
     {
+        std::vector<std::string> found;
         for (const std::string& line : lines()) {
             if (line.find(piece) != std::string::npos) {
-                return true;
+                found.push_back(line);
             }
         }
-        return false;
+        return found;
+    }
+    bool contains(const std::string& piece) { return !matching(piece).empty(); }
+    std::size_t count(const std::string& piece) { return matching(piece).size(); }
+    // Waits (generously) until a line with the piece has been written.
+    bool waitFor(const std::string& piece)
+    {
+        std::unique_lock<std::mutex> lock(m_cMutex);
+        return m_cCondition.wait_for(lock, kDeadline, [&] {
+            for (const std::string& line : m_cLines) {
+                if (line.find(piece) != std::string::npos) {
+                    return true;
+                }
+            }
+            return false;
+        });
     }
 
 private:
     int m_nSavedLevel;
     std::mutex m_cMutex;
+    std::condition_variable m_cCondition;
     std::vector<std::string> m_cLines;
 };
 
