@@ -8,7 +8,7 @@ bash scripts/setup.sh || exit 1
 
 export WINEDEBUG=-all
 export WINEPREFIX="${WINEPREFIX:-$PWD/build/wineprefix}"
-export CCACHE_DIR="${CCACHE_DIR:-$HOME/.cache/ccache}"
+export CCACHE_DIR="${CCACHE_DIR:-${HOME:-/root}/.cache/ccache}"
 launcher=(); command -v ccache >/dev/null && launcher=(-DCMAKE_C_COMPILER_LAUNCHER=ccache -DCMAKE_CXX_COMPILER_LAUNCHER=ccache)
 
 passed=0; failed=0
