@@ -168,13 +168,15 @@ ViStatus CRuntime::createLock(ViConstString szName, ViSvcHandle *phLock) {
   return VI_SUCCESS;
 }
 
+CRuntime::CSvcLock *CRuntime::findLock(ViSvcHandle hLock) {
+  std::lock_guard<std::mutex> aGuard(m_aMutex);
+  for (auto &sEntry : m_mapLocks)
+    if (sEntry.second.get() == hLock) return sEntry.second.get();
+  return nullptr;
+}
+
 ViStatus CRuntime::acquireLock(ViSvcHandle hLock, ViUInt32 nTimeout) {
-  CSvcLock *pc = nullptr;
-  {
-    std::lock_guard<std::mutex> aGuard(m_aMutex);
-    for (auto &sEntry : m_mapLocks)
-      if (sEntry.second.get() == hLock) pc = sEntry.second.get();
-  }
+  CSvcLock *pc = findLock(hLock);
   if (!pc) return VI_ERROR_INV_OBJECT;
   std::unique_lock<std::mutex> aGuard(pc->m_aMutex);
   // Recursive per thread: a passport that re-enters its own locked code does not deadlock.
@@ -194,12 +196,7 @@ ViStatus CRuntime::acquireLock(ViSvcHandle hLock, ViUInt32 nTimeout) {
 }
 
 ViStatus CRuntime::releaseLock(ViSvcHandle hLock) {
-  CSvcLock *pc = nullptr;
-  {
-    std::lock_guard<std::mutex> aGuard(m_aMutex);
-    for (auto &sEntry : m_mapLocks)
-      if (sEntry.second.get() == hLock) pc = sEntry.second.get();
-  }
+  CSvcLock *pc = findLock(hLock);
   if (!pc) return VI_ERROR_INV_OBJECT;
   std::lock_guard<std::mutex> aGuard(pc->m_aMutex);
   if (pc->m_pOwner != &tl_cThreadTag) return VI_ERROR_SESN_NLOCKED;

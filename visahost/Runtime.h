@@ -132,6 +132,7 @@ class CRuntime {
   CRuntime() = default;
   void loadPassports();
   PObject find(ViObject nHandle) const;  // caller holds m_aMutex
+  CSvcLock *findLock(ViSvcHandle hLock);  // null for a handle service 30 never gave out
   PObject add(EKind eKind, ViSession nRm, const std::string &strRsrc);
   void erase(ViObject nHandle);  // caller holds m_aMutex
   std::vector<CTable *> tablesWith(const char *szOperation);
