@@ -6,15 +6,16 @@
 // CLock<CCriticalSection>: scoped guard, enters at construction, leaves at destruction.
 #include <atomic>
 #include <boost/noncopyable.hpp>
+#include "core/ThreadSafety.h"
 
 namespace LbCore {
 
-class CCriticalSection : private boost::noncopyable {
+class CAPABILITY("critical section") CCriticalSection : private boost::noncopyable {
 public:
     CCriticalSection();
     ~CCriticalSection();
-    void enter();
-    void leave();
+    void enter() ACQUIRE();
+    void leave() RELEASE();
 
 private:
     // Storage for the platform lock object, so this header needs no platform header.
@@ -23,10 +24,10 @@ private:
 };
 
 template <class T>
-class CLock : private boost::noncopyable {
+class SCOPED_CAPABILITY CLock : private boost::noncopyable {
 public:
-    explicit CLock(T& section) : m_pcSection(&section) { m_pcSection->enter(); }
-    virtual ~CLock() { m_pcSection->leave(); }
+    explicit CLock(T& section) ACQUIRE(section) : m_pcSection(&section) { m_pcSection->enter(); }
+    virtual ~CLock() RELEASE() { m_pcSection->leave(); }
 
 private:
     T* m_pcSection;

@@ -184,7 +184,7 @@ TEST_F(CLogTest, TwoThreadsWriteWholeLines)
     {
         CLogFileAppender appender(path);
         ASSERT_TRUE(appender.isOpen());
-        auto writer = [this](const char* name) {
+        auto writer = [](const char* name) {
             CLogger logger = CLogManager::getLogger(name);
             for (int i = 0; i < kLines; ++i) {
                 logger.info() << "LbCore::CTest::write" << " - " << "line " << i << " of " << name;
