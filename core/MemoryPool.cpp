@@ -28,10 +28,6 @@ void CMemoryPool::free(void* pointer)
     std::free(pointer);
 }
 
-void CMemoryPool::report(std::ostream&)
-{
-}
-
 void* CMemoryPool::CMemoryPoolManaged::operator new(std::size_t size)
 {
     void* pointer = CMemoryPool::getInstance().allocate(size, 0, 0, 0);

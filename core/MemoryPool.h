@@ -5,7 +5,6 @@
 // Every class derived from CMemoryPool::CMemoryPoolManaged is allocated and freed through it.
 #include <cstddef>
 #include <new>
-#include <ostream>
 
 namespace LbCore {
 
@@ -25,8 +24,6 @@ public:
     // The three further arguments are zero in the system and have no effect.
     void* allocate(std::size_t size, int reserved1 = 0, int reserved2 = 0, int reserved3 = 0);
     void free(void* pointer);
-    // The pool keeps no statistics, so it writes nothing.
-    void report(std::ostream& stream);
 
 private:
     CMemoryPool() {}

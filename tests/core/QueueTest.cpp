@@ -1,5 +1,6 @@
 #include "core/Queue.h"
 #include "core/Semaphore.h"
+#include "tests/core/TestSupport.h"
 
 #include <gtest/gtest.h>
 
@@ -80,7 +81,15 @@ TEST(CQueueTest, InterruptWakesAWaitingConsumer)
 {
     CQueue<CItem> queue(2);
     std::atomic<int> result(-1);
-    std::thread consumer([&] { result = popValue(queue, kInfinite); });
+    std::atomic<long> consumerId(-1);
+    std::thread consumer([&] {
+        consumerId = LbTests::currentThreadId();
+        result = popValue(queue, kInfinite);
+    });
+    while (consumerId.load() == -1) {
+        std::this_thread::yield();
+    }
+    ASSERT_TRUE(LbTests::waitUntilSleeping(consumerId.load())); // the consumer really waits
     queue.interrupt();
     consumer.join();
     EXPECT_EQ(-2, result.load());
