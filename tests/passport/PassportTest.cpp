@@ -157,7 +157,9 @@ TEST_F(Sessions, ASecondCommandWhileOneWaitsIsRefusedAtOnce)
     EXPECT_EQ(VI_SUCCESS, viReadSTB(other, &stb));
     // The format commands do not need the session.
     EXPECT_EQ(VI_SUCCESS, write(other, "FORMAT ASCII"));
-    // A sensor error ends the waiting write with that error.
+    // A sensor error ends the waiting write with that error, once the write has waited (here
+    // briefly) for the refused command's acknowledgement, which does not come.
+    ASSERT_EQ(VI_SUCCESS, viSetAttribute(other, VI_ATTR_TMO_VALUE, 100));
     ASSERT_EQ(0, PmxSimReportError("100000", 0x12345));
     writer.join();
     ASSERT_EQ(0, PmxSimSetAutoAck(1));
