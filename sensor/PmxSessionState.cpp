@@ -101,6 +101,7 @@ public:
         CPmxSession* session = buffer.getParent();
         CPmxSessionDispatcher* dispatcher = session->getParent();
         bool previousText = false;
+        bool fetched = false;
         try {
             for (;;) {
                 std::int32_t type = 0;
@@ -123,6 +124,7 @@ public:
                 working.apply(CPmxDataSerializerFactory::getInstance().get(kind));
                 buffer = working;
                 previousText = text;
+                fetched = true;
             }
         } catch (...) {
             // A failed read still discards what the library holds, so that a result which could
@@ -132,6 +134,15 @@ public:
             } catch (...) {
             }
             throw;
+        }
+        if (!fetched) {
+            // The announcement outlived its result: an earlier read fetched it before the data
+            // notification arrived (continuous measurements), or a command or a clear discarded
+            // it. Nothing is pending, so the read waits as it does in NoData rather than
+            // succeeding with no bytes.
+            session->changeState(noData());
+            session->getState()->serialize(buffer);
+            return;
         }
         dispatcher->callChecked(&CIPmxCommands::emptyAllBuffers, *session);
     }

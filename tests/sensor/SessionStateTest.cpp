@@ -120,11 +120,20 @@ TEST_F(SessionState, ResultFirstThenRead)
     EXPECT_EQ(CIPmxSessionState::noData(), state());
 }
 
-TEST_F(SessionState, DataAvailableWithoutAResultAnswersNothing)
+TEST_F(SessionState, DataAvailableWithoutAResultWaitsForTheNextOne)
 {
+    // An announcement whose result is gone: the read waits as in NoData.
+    session().setTimeout(50);
     session().changeState(CIPmxSessionState::dataAvailable());
-    EXPECT_EQ("", read());
+    EXPECT_THROW(read(), CIPmxSessionState::CPmxNoDataAvailableException);
     EXPECT_EQ(CIPmxSessionState::noData(), state());
+    session().setTimeout(20000);
+    session().changeState(CIPmxSessionState::dataAvailable());
+    std::string reply;
+    std::thread reader([&] { reply = read(); });
+    ASSERT_EQ(0, PmxSimQueueResult(LbTests::kSerial, 6, std::vector<float>{3.0f}.data(), 1));
+    reader.join();
+    EXPECT_EQ("3.000000e+000", reply);
 }
 
 TEST_F(SessionState, AFailedFetchFailsTheReadWithItsCode)
@@ -205,7 +214,8 @@ TEST_F(SessionState, ACommandForTheSensorGivesUpAPendingResultButNotAQueriedOne)
     session().write("*cls");
     EXPECT_EQ(CIPmxSessionState::dataAvailable(), state());
     // The library's buffers were emptied for the command, so nothing is left to fetch.
-    EXPECT_EQ("", read());
+    session().setTimeout(50);
+    EXPECT_THROW(read(), CIPmxSessionState::CPmxNoDataAvailableException);
 }
 
 TEST_F(SessionState, WriteThenReadTheIdentity)
