@@ -217,6 +217,8 @@ TEST_F(Recovery, AReattachedSensorWorksBesideADeadOldSession)
     ASSERT_EQ(VI_SUCCESS, write(fresh, "*IDN?"));
     EXPECT_EQ("Marlowe&Tenby,PMX-M01,100000,1.20", read(fresh));
     EXPECT_EQ(VI_ERROR_SYSTEM_ERROR, write(old, "*IDN?"));
+    EXPECT_TRUE(logContains("[WARN ] CPmxSession - LbPmxVisa::CPmxSession::notifyDeviceChangedEvent - "
+                            "Device has been changed for session [Id: "));
     EXPECT_EQ(VI_SUCCESS, viClose(old));
     ASSERT_EQ(VI_SUCCESS, write(fresh, "*IDN?"));
     EXPECT_EQ("Marlowe&Tenby,PMX-M01,100000,1.20", read(fresh));

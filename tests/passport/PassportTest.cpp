@@ -119,27 +119,6 @@ TEST_F(Sessions, MeasurementInAsciiAndBinary)
     EXPECT_EQ("0, \"No Error\"", read(session));
 }
 
-TEST_F(Sessions, ReadTimesOutAfterTheSetTimeoutAndReportsSmallBuffers)
-{
-    ViSession session = open(SENSOR);
-    ASSERT_EQ(VI_SUCCESS, viSetAttribute(session, VI_ATTR_TMO_VALUE, 200));
-    ViStatus status = VI_SUCCESS;
-    read(session, 1024, &status);
-    EXPECT_EQ(VI_ERROR_TMO, status);
-
-    ASSERT_EQ(VI_SUCCESS, write(session, "*IDN?"));
-    read(session, 5, &status);
-    EXPECT_EQ(VI_ERROR_USER_BUF, status);
-}
-
-TEST_F(Sessions, UnknownCommandsAnswerNotSupported)
-{
-    ViSession session = open(SENSOR);
-    EXPECT_EQ(VI_ERROR_NSUP_OPER, write(session, "BOGUS:COMMAND"));
-    ASSERT_EQ(VI_SUCCESS, write(session, "SYST:ERR?"));
-    EXPECT_EQ(std::to_string(static_cast<int>(0xD0000089u)) + ", \"", read(session).substr(0, 13));
-}
-
 TEST_F(Sessions, ASecondCommandWhileOneWaitsIsRefusedAtOnce)
 {
     ViSession session = open(SENSOR);
