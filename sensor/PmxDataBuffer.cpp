@@ -25,7 +25,7 @@ struct CPmxDataBuffer::CTypeMapping<T, 1> {
 };
 
 CPmxDataBuffer::CPmxDataBuffer(CPmxSession& session, char* buffer, std::size_t capacity, std::uint32_t* count)
-    : LbCore::CParent<CPmxSession>(&session), m_pcPosition(buffer), m_nCapacity(capacity), m_pnCount(count)
+    : LbCore::CParent<CPmxSession>(&session), m_pcPosition(buffer), m_nCapacity(capacity), m_pnCount(count), m_pcSpill(0)
 {
 }
 
@@ -33,7 +33,8 @@ CPmxDataBuffer::CPmxDataBuffer(const CPmxDataBuffer& other)
     : LbCore::CParent<CPmxSession>(other.m_pcParent),
       m_pcPosition(other.m_pcPosition),
       m_nCapacity(other.m_nCapacity),
-      m_pnCount(other.m_pnCount)
+      m_pnCount(other.m_pnCount),
+      m_pcSpill(other.m_pcSpill)
 {
 }
 
@@ -44,6 +45,7 @@ CPmxDataBuffer& CPmxDataBuffer::operator=(const CPmxDataBuffer& other)
         m_pcPosition = other.m_pcPosition;
         m_nCapacity = other.m_nCapacity;
         *m_pnCount = *other.m_pnCount;
+        m_pcSpill = other.m_pcSpill;
     }
     return *this;
 }
@@ -54,9 +56,27 @@ std::size_t CPmxDataBuffer::getRoom() const
     return *m_pnCount >= m_nCapacity ? 0 : m_nCapacity - *m_pnCount;
 }
 
+bool CPmxDataBuffer::spill(const char* source, std::size_t length, bool text)
+{
+    if (m_pcSpill == 0) {
+        return false;
+    }
+    if (!m_pcSpill->m_bActive) {
+        // What this read has written so far lies between the buffer's start and the position.
+        m_pcSpill->m_sBytes.assign(m_pcPosition - *m_pnCount, *m_pnCount);
+        m_pcSpill->m_bActive = true;
+    }
+    m_pcSpill->m_sBytes.append(source, length);
+    m_pcSpill->m_bText = text;
+    return true;
+}
+
 void CPmxDataBuffer::write(const std::string& text)
 {
-    if (text.size() + 1 > getRoom()) {
+    if ((m_pcSpill != 0 && m_pcSpill->m_bActive) || text.size() + 1 > getRoom()) {
+        if (spill(text.data(), text.size(), true)) {
+            return;
+        }
         throw CPmxDataBufferOverFlowException();
     }
     if (!text.empty()) {
@@ -82,9 +102,21 @@ void CPmxDataBuffer::write(const char* source, unsigned length)
     CTypeMapping<const char*, 1>::CBufferHolder(this, source).write(length);
 }
 
+void CPmxDataBuffer::write(const CSpill& reply)
+{
+    if (reply.m_bText) {
+        write(reply.m_sBytes);
+    } else {
+        writeRaw(reply.m_sBytes.data(), static_cast<unsigned>(reply.m_sBytes.size()));
+    }
+}
+
 void CPmxDataBuffer::writeRaw(const void* source, unsigned length)
 {
-    if (length > getRoom()) {
+    if ((m_pcSpill != 0 && m_pcSpill->m_bActive) || length > getRoom()) {
+        if (spill(static_cast<const char*>(source), length, false)) {
+            return;
+        }
         throw CPmxDataBufferOverFlowException();
     }
     if (length != 0) {
@@ -97,6 +129,9 @@ void CPmxDataBuffer::writeRaw(const void* source, unsigned length)
 bool CPmxDataBuffer::copyTo(char* destination, const void* source, std::size_t length)
 {
     // Compared as addresses: the destination may lie anywhere, even outside the caller's buffer.
+    if (m_pcSpill != 0 && m_pcSpill->m_bActive) {
+        return false;
+    }
     std::uintptr_t start = reinterpret_cast<std::uintptr_t>(m_pcPosition) - *m_pnCount;
     std::uintptr_t target = reinterpret_cast<std::uintptr_t>(destination);
     if (target < start + 1 || target > start + m_nCapacity || length > start + m_nCapacity - target || length > getRoom()) {

@@ -4,7 +4,9 @@
 // byte count) with one overflow rule: room left = capacity - count. A text write needs one more
 // byte for its terminating zero, which is written but not counted; a raw write needs exactly
 // its length. Copies share the caller's count (a snapshot); assigning a snapshot back restores
-// its position while the count keeps its value.
+// its position while the count keeps its value. A buffer given a spill (setSpill) does not throw
+// the overflow: from the write that does not fit on, the reply so far and every later write go
+// to the spill, which its owner keeps for a later read.
 #include "core/Command.h"
 #include "core/Parent.h"
 
@@ -30,6 +32,26 @@ public:
 
     typedef LbCore::CISerializer<CPmxDataBuffer&, void> CSerializer;
 
+    // A reply that outgrew the caller's buffer, whole: its bytes, and whether its last write was
+    // a text write (which needs one byte more for its zero byte when it is written again).
+    class CSpill {
+    public:
+        CSpill() : m_bActive(false), m_bText(false) {}
+        bool isActive() const { return m_bActive; }
+        void clear()
+        {
+            m_sBytes.clear();
+            m_bActive = false;
+            m_bText = false;
+        }
+
+    private:
+        friend class CPmxDataBuffer;
+        std::string m_sBytes;
+        bool m_bActive;
+        bool m_bText;
+    };
+
     CPmxDataBuffer(CPmxSession& session, char* buffer, std::size_t capacity, std::uint32_t* count);
     CPmxDataBuffer(const CPmxDataBuffer& other);
     CPmxDataBuffer& operator=(const CPmxDataBuffer& other);
@@ -40,7 +62,10 @@ public:
     void write(unsigned char (*source)[1024], unsigned length);
     void write(float* source, unsigned length);
     void write(const char* source, unsigned length);
+    // Writes a spilled reply again, as one write of the kind it ended with.
+    void write(const CSpill& reply);
     bool copyTo(char* destination, const void* source, std::size_t length);
+    void setSpill(CSpill* spill) { m_pcSpill = spill; }
     void apply(const CSerializer& serializer) { serializer.serialize(*this); }
 
     char* getPosition() const { return m_pcPosition; }
@@ -50,10 +75,13 @@ public:
 
 private:
     void writeRaw(const void* source, unsigned length);
+    // True when the bytes went to the spill; false when there is none and the caller must throw.
+    bool spill(const char* source, std::size_t length, bool text);
 
     char* m_pcPosition;
     std::size_t m_nCapacity;
     std::uint32_t* m_pnCount;
+    CSpill* m_pcSpill;
 };
 
 // Writes an IEEE 488.2 definite-length block header "#<digits><byteCount>".

@@ -36,6 +36,17 @@ enum EDataType : std::int32_t {
 
 typedef LbCore::CISerializer<CPmxDataBuffer&, void> CPmxDataSerializer;
 
+// Whether a result of this type is written as text in the data format (0 ASCII, 1 binary); the
+// others are raw bytes: the binary-block result always, float arrays and the stream result in
+// binary.
+inline bool isTextResult(EDataType type, std::uint32_t dataFormat)
+{
+    if (type == eBinaryBlock) {
+        return false;
+    }
+    return dataFormat != 1 || (type != eFloatArray && type != eFloatStream && type != eAuxFloatArray);
+}
+
 // Text of one scalar: plain signed decimal for integers, formatFloat for floats.
 inline std::string formatValue(std::int32_t value) { return std::to_string(value); }
 inline std::string formatValue(float value) { return formatFloat(value); }

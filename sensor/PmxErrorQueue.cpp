@@ -20,19 +20,21 @@ CPmxErrorQueue::CPmxErrorQueue(CPmxSession* session) : LbCore::CParent<CPmxSessi
 // running here.
 CPmxErrorQueue::~CPmxErrorQueue() {}
 
+// The entry leaves the list only once it has been written: a reply that does not fit keeps it.
+// The lock is held across the write (a plain copy) so that an error recorded meanwhile cannot
+// take the written entry's place at the end.
 void CPmxErrorQueue::serialize(CPmxDataBuffer& buffer) const
 {
-    std::pair<std::int32_t, std::string> entry(0, "No Error");
-    {
-        LbCore::CLock<LbCore::CCriticalSection> lock(m_cLock);
-        if (!m_cEntries.empty()) {
-            entry = m_cEntries.back();
-            m_cEntries.pop_back();
-        }
-    }
+    LbCore::CLock<LbCore::CCriticalSection> lock(m_cLock);
     std::ostringstream text;
-    text << entry.first << ", \"" << entry.second << "\"";
+    if (m_cEntries.empty()) {
+        text << 0 << ", \"" << "No Error" << "\"";
+        buffer.write(text.str());
+        return;
+    }
+    text << m_cEntries.back().first << ", \"" << m_cEntries.back().second << "\"";
     buffer.write(text.str());
+    m_cEntries.pop_back();
 }
 
 bool CPmxErrorQueue::isEmpty() const

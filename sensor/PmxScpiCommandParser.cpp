@@ -126,7 +126,10 @@ CPmxScpiCommandParser& CPmxScpiCommandParser::getInstance()
 
 CPmxScpiCommandParser::ECommandType CPmxScpiCommandParser::parse(const std::string& command) const
 {
-    const std::string text = command.substr(0, command.find('\n'));
+    // Trailing line ends and blanks do not change what a command is: clients end commands with
+    // "\r\n" as readily as with "\n", and the format tests ignore them already.
+    std::string text = command.substr(0, command.find('\n'));
+    text.erase(text.find_last_not_of(" \r\t") + 1);
     if (isSystemErrorQuery(text)) {
         return COMMAND_SYSTEM_ERROR_QUERY;
     }

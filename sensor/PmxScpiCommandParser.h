@@ -3,7 +3,7 @@
 // CPmxScpiCommandParser: classifies one written command piece (already split at ";",
 // lower-cased and stripped of one leading ":" by the session) as one of the commands the
 // system answers itself, or as a command for the sensor. Only the text before the first line
-// feed counts. The tests run in the order of ECommandType and the first that holds decides.
+// feed counts, without trailing blanks, tabs and carriage returns. The tests run in the order of ECommandType and the first that holds decides.
 // Stateless: one shared instance serves every session and thread without a lock; it never
 // fails, anything unrecognised is COMMAND_OTHER.
 //

@@ -8,6 +8,7 @@
 
 #include <boost/tokenizer.hpp>
 #include <cctype>
+#include <chrono>
 #include <memory>
 #include <stdexcept>
 
@@ -19,31 +20,11 @@ namespace {
 
 typedef LbCore::CQueue<CPmxSession::CPmxSessionMessage> CMessageQueue;
 
-// Throws away every message no writer has taken, without delivering it.
-void clearMessages(CMessageQueue& queue)
-{
-    CPmxSession::CPmxSessionMessage* message = 0;
-    int result;
-    while ((result = queue.pop(message, 0)) != CMessageQueue::RESULT_TIMEOUT) {
-        if (result == CMessageQueue::RESULT_ITEM) {
-            delete message;
-        }
-    }
-}
-
 // The VISA time-out is unsigned 64-bit; waits take 32 bits, where 0xFFFFFFFF means no limit.
 unsigned toWait(std::uint64_t timeoutMs)
 {
     return timeoutMs >= LbCore::CSemaphore::INFINITE_WAIT ? LbCore::CSemaphore::INFINITE_WAIT
                                                           : static_cast<unsigned>(timeoutMs);
-}
-
-// A notification runs on the event thread and must not fail there: without memory for the
-// message the waiting writer simply sees no answer and ends at its time-out.
-void logLostMessage(const CPmxSession* session)
-{
-    s_cLogger.error() << "LbPmxVisa::CPmxSession::notify" << " - " << "Could not create a message for session "
-                      << session;
 }
 
 } // namespace
@@ -52,9 +33,10 @@ void logLostMessage(const CPmxSession* session)
 // the last byte, termination character line feed, not enabled.
 CPmxSession::CPmxSession(CPmxSessionDispatcher* dispatcher, const CPmxResourceInfo& resource)
     : LbCore::CParent<CPmxSessionDispatcher>(dispatcher), m_cResourceInfo(resource),
-      m_pcState(CIPmxSessionState::noData()), m_lHandle(0), m_cEventDispatcher(this), m_nCommandCount(0),
+      m_pcState(CIPmxSessionState::noData()), m_cStateLock(), m_lHandle(0), m_cEventDispatcher(this), m_nCommandCount(0),
       m_nMessageCount(0), m_lBusy(0), m_cDataSemaphore(0), m_cMessageQueue(10), m_cErrorQueue(this), m_nTimeout(5000),
-      m_nDataFormat(0), m_nSuppressEndEnabled(0), m_nSendEndEnabled(1), m_nTermCharEnabled(0), m_nTermChar('\n')
+      m_nDataFormat(0), m_nSuppressEndEnabled(0), m_nSendEndEnabled(1), m_nTermCharEnabled(0), m_nTermChar('\n'),
+      m_bReplyHeld(false), m_bSensorRemoved(false)
 {
 }
 
@@ -121,6 +103,53 @@ void CPmxSession::execute(const CSessionCommand& command)
     }
 }
 
+// The sensor answers a refused command with the error and then the command's acceptance. Taking
+// that acceptance here leaves no answer of this command for the next one. Messages are told
+// apart by what they do, not by the callback's value. Without an acceptance in time the count
+// stays one behind and the next command's purge accounts for it.
+void CPmxSession::takeAcknowledgement()
+{
+    const std::uint64_t timeout = m_nTimeout;
+    const std::chrono::steady_clock::time_point start = std::chrono::steady_clock::now();
+    for (;;) {
+        std::uint64_t left = timeout;
+        if (timeout < LbCore::CSemaphore::INFINITE_WAIT) {
+            const std::uint64_t spent = static_cast<std::uint64_t>(
+                std::chrono::duration_cast<std::chrono::milliseconds>(std::chrono::steady_clock::now() - start).count());
+            left = spent >= timeout ? 0 : timeout - spent;
+        }
+        CPmxSessionMessage* message = 0;
+        if (m_cMessageQueue.pop(message, toWait(left)) != CMessageQueue::RESULT_ITEM) {
+            return;
+        }
+        std::unique_ptr<CPmxSessionMessage> owner(message);
+        try {
+            owner->deliver();
+        } catch (const CPmxSessionDispatcher::CPmxCommandException&) {
+            continue; // a further error of the same command; its acceptance is still to come
+        }
+        ++m_nMessageCount;
+        return;
+    }
+}
+
+void CPmxSession::clearMessages()
+{
+    CPmxSessionMessage* message = 0;
+    int result;
+    while ((result = m_cMessageQueue.pop(message, 0)) != CMessageQueue::RESULT_TIMEOUT) {
+        if (result == CMessageQueue::RESULT_ITEM) {
+            delete message;
+        }
+    }
+}
+
+void CPmxSession::dropReply()
+{
+    m_bReplyHeld = false;
+    m_cReply.clear();
+}
+
 void CPmxSession::write(const std::string& command)
 {
     class CWriteCommand : public CSessionCommand {
@@ -135,7 +164,8 @@ void CPmxSession::write(const std::string& command)
                                   << "fetch command executed " << &session;
                 return;
             }
-            clearMessages(session.m_cMessageQueue);
+            session.dropReply();
+            session.clearMessages();
             ++session.m_nCommandCount;
             // Answers of earlier commands that were never accounted for are purged before this
             // command is sent: purging after the send would throw away this command's own
@@ -161,6 +191,10 @@ void CPmxSession::write(const std::string& command)
                               << "Execute PmxSendCommand(...) [" << m_sText << "] for session " << &session;
             dispatcher->callChecked(&CIPmxCommands::sendCommand, session, m_sText);
 
+            // Set before the removal message is queued: a writer that misses the message sees the flag.
+            if (session.m_bSensorRemoved) {
+                throw CPmxSensorRemovedException();
+            }
             CPmxSessionMessage* message = 0;
             if (session.m_cMessageQueue.pop(message, toWait(session.m_nTimeout)) != CMessageQueue::RESULT_ITEM) {
                 s_cLogger.info() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
@@ -174,7 +208,13 @@ void CPmxSession::write(const std::string& command)
                               << &session;
             s_cLogger.debug() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
                               << "Delivering message for session " << &session;
-            owner->deliver();
+            try {
+                owner->deliver();
+            } catch (const CPmxSessionDispatcher::CPmxCommandException&) {
+                owner.reset();
+                session.takeAcknowledgement();
+                throw;
+            }
             ++session.m_nMessageCount;
         }
 
@@ -201,6 +241,7 @@ void CPmxSession::write(const std::string& command)
             public:
                 void execute(CPmxSession& session) override
                 {
+                    session.dropReply();
                     session.changeState(CIPmxSessionState::errorQueueToNoData());
                 }
             };
@@ -213,6 +254,7 @@ void CPmxSession::write(const std::string& command)
             public:
                 void execute(CPmxSession& session) override
                 {
+                    session.dropReply();
                     session.changeState(CIPmxSessionState::opStatusToNoData());
                 }
             };
@@ -245,13 +287,30 @@ void CPmxSession::read(CPmxDataBuffer& buffer)
         {
             s_cLogger.debug() << "LbPmxVisa::CPmxSession::read::CReadCommand::execute" << " - "
                               << "Executing GetData(...) method for fetching Pmx-Data for session " << &session;
-            try {
-                m_rBuffer.apply(*session.getState());
-            } catch (...) {
+            CPmxDataBuffer::CSpill& reply = session.m_cReply;
+            m_rBuffer.setSpill(&reply);
+            if (session.m_bReplyHeld) {
+                // The reply kept by an earlier read comes first; the state machine has moved on
+                // past it already and stays as it is.
+                CPmxDataBuffer::CSpill held;
+                std::swap(held, reply);
+                session.m_bReplyHeld = false;
+                m_rBuffer.write(held);
+            } else {
+                reply.clear();
+                try {
+                    m_rBuffer.apply(*session.getState());
+                } catch (...) {
+                    reply.clear();
+                    session.changeState(CIPmxSessionState::noData());
+                    throw;
+                }
                 session.changeState(CIPmxSessionState::noData());
-                throw;
             }
-            session.changeState(CIPmxSessionState::noData());
+            if (reply.isActive()) {
+                session.m_bReplyHeld = true;
+                throw CPmxDataBuffer::CPmxDataBufferOverFlowException();
+            }
         }
 
     private:
@@ -273,7 +332,8 @@ void CPmxSession::readSTB(std::uint16_t* status)
     if (!m_cErrorQueue.isEmpty()) {
         flags |= 4;
     }
-    if (getState() == CIPmxSessionState::dataAvailable()) {
+    // A kept reply is an answer waiting to be read as much as a pending result is.
+    if (getState() == CIPmxSessionState::dataAvailable() || m_bReplyHeld) {
         flags |= 16;
     }
     std::int32_t trigger = 0;
@@ -293,6 +353,13 @@ void CPmxSession::clear()
             s_cLogger.info() << "LbPmxVisa::CPmxSession::clear::CClearCommand::execute" << " - " << "Clearing session "
                              << &session;
             session.getParent()->callChecked(&CIPmxCommands::clearDevice, session);
+            // The device has discarded its results: nothing is pending any more, so the status
+            // byte and the next read agree (a read waits as on a fresh session). A remembered
+            // result turns into DataAvailable first, hence up to two steps.
+            session.dropReply();
+            for (int step = 0; step < 2 && session.getState() != CIPmxSessionState::noData(); ++step) {
+                session.changeState(CIPmxSessionState::noData());
+            }
         }
     };
     static CClearCommand s_cCommand;
@@ -324,53 +391,6 @@ void CPmxSession::serialize(LbCore::CLogMessage& message) const
     message << "[Id: " << static_cast<std::int32_t>(static_cast<std::uint32_t>(m_lHandle & 0xFFFFFFFF))
             << ", State: " << getState()->getName() << ", Resource: " << g_pcPmxSerializer->serialize(m_cResourceInfo)
             << "]";
-}
-
-void CPmxSession::notifyCommandAcceptedEvent(const CPmxEvent&)
-{
-    class CPmxCommandAcceptedEventMessage : public CPmxSessionMessage {
-    public:
-        void deliver() override {}
-    };
-    CPmxSessionMessage* message = new (std::nothrow) CPmxCommandAcceptedEventMessage();
-    if (message == 0) {
-        logLostMessage(this);
-        return;
-    }
-    m_cMessageQueue.push(message, 0);
-}
-
-void CPmxSession::notifyDataAvailableEvent(const CPmxEvent&)
-{
-    changeState(CIPmxSessionState::dataAvailable());
-}
-
-void CPmxSession::notifyErrorOccuredEvent(const CPmxEvent& event)
-{
-    class CPmxCommandErrorEventMessage : public CPmxSessionMessage {
-    public:
-        explicit CPmxCommandErrorEventMessage(const CPmxEvent& event) : m_cEvent(event) {}
-        void deliver() override { throw CPmxSessionDispatcher::CPmxCommandException(m_cEvent.value); }
-
-    private:
-        CPmxEvent m_cEvent;
-    };
-    CPmxSessionMessage* message = new (std::nothrow) CPmxCommandErrorEventMessage(event);
-    if (message == 0) {
-        logLostMessage(this);
-        return;
-    }
-    m_cMessageQueue.push(message, 0);
-}
-
-void CPmxSession::notifyStateChangedEvent(const CPmxEvent&) {}
-
-void CPmxSession::notifyDeviceChangedEvent(const CPmxEvent&)
-{
-    clearMessages(m_cMessageQueue);
-    s_cLogger.warn() << "LbPmxVisa::CPmxSession::notifyDeviceChangedEvent" << " - " << "Device has been changed for session "
-                     << this;
-    changeState(CIPmxSessionState::noData());
 }
 
 } // namespace LbPmxVisa

@@ -7,6 +7,10 @@
 // interlocked busy flag; a concurrent one is refused at once with CPmxSessionIsBusyException.
 // Sensor notifications arrive on the session's own event-dispatcher thread. The destructor
 // closes the sensor and leaves the dispatcher; it never throws (failures are logged at ERROR).
+// A reply that does not fit the reader's buffer is kept whole for the next read (the read still
+// fails with the overflow); writing a command or clearing the device gives it up. A session
+// whose sensor has left the library's device list is dead: a waiting write fails at once, and
+// the dispatcher no longer hands it out.
 #include "core/Command.h"
 #include "core/Lock.h"
 #include "core/Log.h"
@@ -14,6 +18,7 @@
 #include "core/Queue.h"
 #include "core/Semaphore.h"
 #include "sensor/PmxCommands.h"
+#include "sensor/PmxDataBuffer.h"
 #include "sensor/PmxErrorQueue.h"
 #include "sensor/PmxEventDispatcher.h"
 #include "sensor/PmxResourceInfo.h"
@@ -27,7 +32,6 @@
 namespace LbPmxVisa {
 
 class CPmxSessionDispatcher;
-class CPmxDataBuffer;
 class CIPmxSessionState;
 
 class CPmxSession : public LbCore::CParent<CPmxSessionDispatcher>,
@@ -50,6 +54,11 @@ public:
         const char* what() const noexcept override { return "The PMX session is currently busy with another command"; }
     };
 
+    class CPmxSensorRemovedException : public std::exception {
+    public:
+        const char* what() const noexcept override { return "The sensor of this session has been removed"; }
+    };
+
     CPmxSession(CPmxSessionDispatcher* dispatcher, const CPmxResourceInfo& resource);
     ~CPmxSession() override;
 
@@ -66,6 +75,8 @@ public:
     void setTimeout(std::uint64_t timeoutMs) { m_nTimeout = timeoutMs; }
     std::uint32_t getDataFormat() const { return m_nDataFormat; }
     std::int64_t getHandle() const { return m_lHandle; }
+    // True once a device change has shown that the sensor left the library's device list.
+    bool isSensorRemoved() const { return m_bSensorRemoved; }
     // Commands sent to the sensor and answers accounted for; equal while nothing is pending.
     std::uint64_t getCommandCount() const { return m_nCommandCount; }
     std::uint64_t getMessageCount() const { return m_nMessageCount; }
@@ -89,6 +100,14 @@ public:
 
 private:
     void execute(const CSessionCommand& command) override;
+    // After a refused command: waits up to the time-out for the command's acknowledgement.
+    void takeAcknowledgement();
+    // Throws away every message no writer has taken, without delivering it.
+    void clearMessages();
+    // Gives up a kept reply (under the busy flag).
+    void dropReply();
+    // Whether the library still lists this sensor; throws when the list cannot be read whole.
+    bool isSensorAttached();
 
     void notifyCommandAcceptedEvent(const CPmxEvent& event) override;
     void notifyDataAvailableEvent(const CPmxEvent& event) override;
@@ -97,9 +116,14 @@ private:
     void notifyDeviceChangedEvent(const CPmxEvent& event) override;
 
     CPmxResourceInfo m_cResourceInfo;
-    // State and handle come before the event dispatcher because its construction may already
-    // describe the session in a log line.
+    // Everything the session's description reads (resource, state and its lock, handle) comes
+    // before the event dispatcher, whose construction may already log that description.
     std::atomic<const CIPmxSessionState*> m_pcState;
+    // Serialises changeState between the command thread and the event thread, so a transition
+    // computed from a stale state never overwrites a newer one. getState takes it too: a
+    // transition may release the data semaphore before the new state is stored, and the woken
+    // reader must see the stored state.
+    mutable LbCore::CCriticalSection m_cStateLock;
     std::int64_t m_lHandle;
     CPmxEventDispatcher m_cEventDispatcher;
     std::uint64_t m_nCommandCount;
@@ -114,11 +138,10 @@ private:
     std::atomic<std::uint8_t> m_nSendEndEnabled;
     std::atomic<std::uint8_t> m_nTermCharEnabled;
     std::atomic<std::uint8_t> m_nTermChar;
-    // Serialises changeState between the command thread and the event thread, so a transition
-    // computed from a stale state never overwrites a newer one. getState takes it too: a
-    // transition may release the data semaphore before the new state is stored, and the woken
-    // reader must see the stored state.
-    mutable LbCore::CCriticalSection m_cStateLock;
+    // The reply kept after an overflow, used under the busy flag; the flag is read by readSTB.
+    CPmxDataBuffer::CSpill m_cReply;
+    std::atomic<bool> m_bReplyHeld;
+    std::atomic<bool> m_bSensorRemoved;
 };
 
 } // namespace LbPmxVisa

@@ -92,6 +92,7 @@ boost::shared_ptr<CPmxSession> CPmxSessionDispatcher::getSession(const CPmxResou
         callChecked(&CIPmxCommands::openDriver);
     }
     std::string key = g_pcVisaSerializer->serialize(resource);
+    boost::shared_ptr<CPmxSession> dead; // released outside the map lock
     {
         CMapGuard guard(m_cMapLock);
         std::unordered_map<std::string, boost::weak_ptr<CPmxSession> >::iterator found = m_cResourceMap.find(key);
@@ -100,6 +101,17 @@ boost::shared_ptr<CPmxSession> CPmxSessionDispatcher::getSession(const CPmxResou
         // one leaves only its own entry (see detach).
         boost::shared_ptr<CPmxSession> session = found != m_cResourceMap.end() ? found->second.lock()
                                                                                : boost::shared_ptr<CPmxSession>();
+        // A session whose sensor was removed stays with the VISA sessions that hold it, dead; a
+        // re-attached sensor gets a new one. The dead one leaves both maps now (no event names
+        // its handle any more); its destructor then finds nothing of its own to remove.
+        if (session && session->isSensorRemoved()) {
+            std::unordered_map<std::int64_t, CPmxSession*>::iterator byHandle = m_cSessionMap.find(session->getHandle());
+            if (byHandle != m_cSessionMap.end() && byHandle->second == session.get()) {
+                m_cSessionMap.erase(byHandle);
+            }
+            m_cResourceMap.erase(found);
+            dead.swap(session);
+        }
         if (session) {
             s_cLogger.info() << "LbPmxVisa::CPmxSessionDispatcher::getSession" << " - " << "Recycle session for "
                              << g_pcVisaSerializer->serialize(session->getResourceInfo());

@@ -93,11 +93,15 @@ public:
     // ended, and the caller's position and count advance past every result, so the reply holds
     // only bytes that a result wrote. (Writing each result over the first one while the count
     // still grew, and repeating a single-value block's four bytes behind the last result, would
-    // leave stale bytes in the reply; that copy is therefore not made.)
+    // leave stale bytes in the reply; that copy is therefore not made.) Two text results in a
+    // row are separated by ",", the SCPI data separator, so that clients can tell them apart;
+    // binary blocks carry their own length and follow each other unseparated.
     void serialize(CPmxDataBuffer& buffer) const override
     {
         CPmxSession* session = buffer.getParent();
         CPmxSessionDispatcher* dispatcher = session->getParent();
+        bool previousText = false;
+        bool fetched = false;
         try {
             for (;;) {
                 std::int32_t type = 0;
@@ -111,9 +115,16 @@ public:
                     }
                     throw;
                 }
+                const EDataType kind = static_cast<EDataType>(type);
+                const bool text = isTextResult(kind, session->getDataFormat());
                 CPmxDataBuffer working(buffer);
-                working.apply(CPmxDataSerializerFactory::getInstance().get(static_cast<EDataType>(type)));
+                if (previousText && text) {
+                    working.write(std::string(","));
+                }
+                working.apply(CPmxDataSerializerFactory::getInstance().get(kind));
                 buffer = working;
+                previousText = text;
+                fetched = true;
             }
         } catch (...) {
             // A failed read still discards what the library holds, so that a result which could
@@ -123,6 +134,15 @@ public:
             } catch (...) {
             }
             throw;
+        }
+        if (!fetched) {
+            // The announcement outlived its result: an earlier read fetched it before the data
+            // notification arrived (continuous measurements), or a command or a clear discarded
+            // it. Nothing is pending, so the read waits as it does in NoData rather than
+            // succeeding with no bytes.
+            session->changeState(noData());
+            session->getState()->serialize(buffer);
+            return;
         }
         dispatcher->callChecked(&CIPmxCommands::emptyAllBuffers, *session);
     }
@@ -148,11 +168,16 @@ class CIPmxSessionState::CPmxErrorQueueDataAvailable_ToNoData : public CIPmxSess
 public:
     void serialize(CPmxDataBuffer& buffer) const override { buffer.apply(buffer.getParent()->getErrorQueue()); }
 
-    // A result arriving now is refused: it is not announced.
+    // A result arriving now is remembered for the read after the error read, as in the status
+    // query's state: refusing it would leave the result in the library unannounced, and the
+    // next command would discard it.
     const CState* nextState(CPmxSession&, const CState* target) const override
     {
         if (target == noData() || target == errorQueueToNoData()) {
             return target;
+        }
+        if (target == dataAvailable()) {
+            return errorQueueToPmxDataAvailable();
         }
         refuse(this, target);
     }

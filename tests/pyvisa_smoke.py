@@ -1,11 +1,15 @@
 """Smoke test with a real VISA client: pyvisa loads the build's `visa` library, lists the sensors,
-opens one with pyvisa's own resource class for the passport's interface type, queries its
-identity, reads a measurement in ASCII and a trace as a binary block, and the error queue.
+opens one with pyvisa's own resource class for the passport's interface type, and, at pyvisa's
+default terminations (writes end in CR LF), queries its identity, reads a measurement in ASCII,
+results pending together and continuous results as ASCII values, a trace as a binary block, the
+operation status and the error queue.
 
 Usage: /usr/bin/python3 pyvisa_smoke.py <path of libvisa.so>
 Exit code 0 when everything answered as expected; the first failure ends the run (a VISA error
 with its traceback, naming the call and its status).
 """
+import ctypes
+import os
 import sys
 
 import pyvisa
@@ -37,24 +41,23 @@ def main(library):
         assert int(info.interface_type) == INTERFACE_TYPE, info
         assert info.resource_class == "INSTR", info
 
+        sim = ctypes.CDLL(os.path.join(os.path.dirname(library), "libPmxControl2_64.so"))
+        sim.PmxSimQueueResult.argtypes = [ctypes.c_char_p, ctypes.c_int32, ctypes.c_void_p, ctypes.c_int32]
         inst = rm.open_resource(name)
         step("opened as %s" % type(inst).__name__)
         assert isinstance(inst, MessageBasedResource), type(inst)
         try:
-            run_session(inst)
+            run_session(inst, sim)
         finally:
             inst.close()
     finally:
         rm.close()
 
 
-def run_session(inst):
+def run_session(inst, sim):
     inst.timeout = 5000
     assert inst.timeout == 5000, inst.timeout
-    # pyvisa ends writes with CR LF by default; the session recognises its own queries
-    # ("SYSTem:ERRor?") only before a bare line feed and sends "syst:err?\r" on to the sensor,
-    # which refuses it (VI_ERROR_NSUP_OPER). A line feed alone ends each command.
-    inst.write_termination = "\n"
+    assert inst.write_termination == "\r\n", repr(inst.write_termination)
 
     idn = inst.query("*IDN?")
     step("*IDN? -> %r" % idn)
@@ -66,6 +69,14 @@ def run_session(inst):
     power = float(inst.query("FETCh?"))
     step("power after a trigger: %.3f dBm" % power)
     assert -100.0 < power < 30.0, power
+
+    # Results pending together are read as one list of values.
+    serial = inst.get_visa_attribute(constants.VI_ATTR_USB_SERIAL_NUM).encode()
+    for value in (1.5, -2.5):
+        assert sim.PmxSimQueueResult(serial, 6, ctypes.byref(ctypes.c_float(value)), 1) == 0
+    pending = inst.query_ascii_values("FETCh?")
+    step("two results pending together: %s" % pending)
+    assert pending == [1.5, -2.5], pending
 
     # A float array follows the data format: after "format real,32" it comes as a binary block.
     inst.write("FUNC TRACE")
@@ -86,6 +97,18 @@ def run_session(inst):
     stb = inst.read_stb()
     step("status byte: %d" % stb)
     assert stb & 4 == 0, stb
+
+    # Continuous results, each read parsed as ASCII values; the operation status shows the
+    # measuring.
+    inst.write("INIT:CONT ON")
+    for _ in range(20):
+        values = inst.query_ascii_values("FETCh?")
+        assert values and all(-100.0 < v < 30.0 for v in values), values
+    step("continuous results: %s" % ", ".join("%.3f" % v for v in values))
+    condition = int(inst.query("STATus:OPERation:CONDition?"))
+    step("STATus:OPERation:CONDition? -> %d" % condition)
+    assert condition in (16, 32), condition
+    inst.write("INIT:CONT OFF")
 
 
 if __name__ == "__main__":

@@ -22,16 +22,17 @@ void expectKinds(CPmxScpiCommandParser::ECommandType kind, const std::vector<std
 TEST(ScpiCommandParser, RecognisesTheErrorQueryInLongAndShortForms)
 {
     expectKinds(CPmxScpiCommandParser::COMMAND_SYSTEM_ERROR_QUERY,
-                {"syst:err?", "system:error?", "SYST:ERROR?", "System:Err?", "syst:err?\nmore text", "syst:err?\n"});
+                {"syst:err?", "system:error?", "SYST:ERROR?", "System:Err?", "syst:err?\nmore text", "syst:err?\n",
+                 "syst:err?\r\n", "syst:err? ", "syst:err?\t\r \n"});
     expectKinds(CPmxScpiCommandParser::COMMAND_OTHER,
-                {"syst:erro?", "syst:err", "syste:err?", "syst:err?\r\n", "syst:err? ", "\"syst:err?\"",
+                {"syst:erro?", "syst:err", "syste:err?", " syst:err?", "syst:err?\r?", "\"syst:err?\"",
                  "syst:err:next?", "syst?", "syst:err?;", "syst:err?:", "syst::err?"});
 }
 
 TEST(ScpiCommandParser, RecognisesTheOperationConditionQuery)
 {
     expectKinds(CPmxScpiCommandParser::COMMAND_OPERATION_CONDITION_QUERY,
-                {"stat:oper:cond?", "status:operation:condition?", "STAT:OPERATION:COND?"});
+                {"stat:oper:cond?", "status:operation:condition?", "STAT:OPERATION:COND?", "stat:oper:cond?\r\n"});
     expectKinds(CPmxScpiCommandParser::COMMAND_OTHER, {"stat:oper?", "stat:oper:cond", "stat:oper:cond:x?"});
 }
 
