@@ -37,8 +37,9 @@ CPmxSessionDispatcher::CPmxSessionDispatcher()
 
 CPmxSessionDispatcher::~CPmxSessionDispatcher()
 {
-    if (m_pcCommand != 0) {
-        detach(m_pcCommand);
+    CIPmxCommands* commands = m_pcCommand;
+    if (commands != 0) {
+        detach(commands);
     }
 }
 
@@ -76,12 +77,18 @@ void CPmxSessionDispatcher::detach(CIPmxCommands* commands)
     self.m_pcCommand = 0;
 }
 
+void CPmxSessionDispatcher::forget(CIPmxCommands* commands)
+{
+    getInstance().m_pcCommand.compare_exchange_strong(commands, 0);
+}
+
 CIPmxCommands* CPmxSessionDispatcher::getCommands()
 {
-    if (m_pcCommand == 0) {
+    CIPmxCommands* commands = m_pcCommand;
+    if (commands == 0) {
         throw std::runtime_error("No configuration has been set. Use method attach(...) for set a configuration");
     }
-    return m_pcCommand;
+    return commands;
 }
 
 boost::shared_ptr<CPmxSession> CPmxSessionDispatcher::getSession(const CPmxResourceInfo& resource)
@@ -136,7 +143,15 @@ std::vector<CPmxResourceInfo> CPmxSessionDispatcher::getAvailableDevices()
         std::string type;
         std::string serial;
         std::int32_t flag = 0;
-        callChecked(&CIPmxCommands::getDeviceInfo, index, name, type, serial, &flag);
+        // A sensor unplugged while the list is read has no information any more; the others
+        // are still worth listing.
+        try {
+            callChecked(&CIPmxCommands::getDeviceInfo, index, name, type, serial, &flag);
+        } catch (const CPmxCommandException& e) {
+            s_cLogger.warn() << "LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices" << " - " << "Skipping device "
+                             << index << ", its information could not be read: " << e.what();
+            continue;
+        }
         s_cLogger.debug() << "LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices" << " - " << "Adding device "
                           << type << ";" << serial;
         if (flag == 0) {
@@ -223,6 +238,27 @@ void CPmxSessionDispatcher::findAndNotify(const CPmxEvent& event, PmxNotificatio
                       << " for session " << session;
     CIPmxEventListener& listener = session->getEventDispatcher();
     (listener.*operation)(event);
+}
+
+void CPmxSessionDispatcher::stopSessions()
+{
+    // Shared references keep the sessions whole while their workers stop outside the map lock (a
+    // worker may be waiting for a lock that a session's user holds while it waits for the map
+    // lock); a session already on its way out stops its own worker.
+    std::vector<boost::shared_ptr<CPmxSession> > sessions;
+    {
+        CMapGuard guard(m_cMapLock);
+        for (std::unordered_map<std::string, boost::weak_ptr<CPmxSession> >::iterator it = m_cResourceMap.begin();
+             it != m_cResourceMap.end(); ++it) {
+            boost::shared_ptr<CPmxSession> session = it->second.lock();
+            if (session) {
+                sessions.push_back(session);
+            }
+        }
+    }
+    for (std::size_t i = 0; i < sessions.size(); ++i) {
+        sessions[i]->getEventDispatcher().shutdown();
+    }
 }
 
 void CPmxSessionDispatcher::notifyCommandAcceptedEvent(const CPmxEvent& event)

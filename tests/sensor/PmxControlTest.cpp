@@ -209,22 +209,37 @@ TEST_F(PmxControlTest, ListenerFailureStaysOutOfTheLibraryThread)
     ASSERT_EQ(0, m_cControl.closeDriver());
 }
 
-TEST_F(PmxControlTest, FailedCloseDriverStaysOpenWithCallbacksRemoved)
+// Callbacks are installed exactly while the driver is open.
+TEST_F(PmxControlTest, FailedCloseDriverStaysOpenAndKeepsReporting)
 {
     ASSERT_EQ(0, m_cControl.openDriver());
     ASSERT_EQ(0, PmxSimFailNext("PmxCloseDriver", 0x5555));
     EXPECT_EQ(0x5555, m_cControl.closeDriver());
     EXPECT_TRUE(m_cControl.isDriverOpen());
-
-    ASSERT_EQ(0, PmxSimAttach("PMX-M02", "1"));
     ASSERT_EQ(0, PmxSimReportError(nullptr, 0x2222));
-    ASSERT_TRUE(drainEvents("2"));
-    EXPECT_TRUE(m_cRecorder.notes().empty());
+    ASSERT_TRUE(m_cRecorder.waitCount(1));
+    EXPECT_EQ((SNote{"error", 0, 0x2222}), m_cRecorder.notes().back());
 
     ASSERT_EQ(0, m_cControl.closeDriver());
     EXPECT_FALSE(m_cControl.isDriverOpen());
     // Any failed close counts as "still open", also the library's own "not open".
     EXPECT_EQ(PMXSIM_E_DRIVER_NOT_OPEN, m_cControl.closeDriver());
+    EXPECT_TRUE(m_cControl.isDriverOpen());
+}
+
+TEST_F(PmxControlTest, FailedRegistrationFailsTheOpenAndRemovedCallbacksStaySilent)
+{
+    ASSERT_EQ(0, PmxSimFailNext("PmxSetNotifyCallbackDataAvailable", 0x7777));
+    EXPECT_EQ(0x7777, m_cControl.openDriver());
+    EXPECT_FALSE(m_cControl.isDriverOpen());
+    std::int32_t count = 0;
+    EXPECT_EQ(PMXSIM_E_DRIVER_NOT_OPEN, PmxGetDeviceListLength(&count)) << "the driver was closed again";
+
+    ASSERT_EQ(0, m_cControl.openDriver());
+    m_cControl.removeCallbacks();
+    ASSERT_EQ(0, PmxSimReportError(nullptr, 0x2222));
+    ASSERT_TRUE(drainEvents("2"));
+    EXPECT_TRUE(m_cRecorder.notes().empty());
     EXPECT_TRUE(m_cControl.isDriverOpen());
 }
 
