@@ -36,9 +36,9 @@ enum EDetach {
     DETACH_THREADS_STOPPED    // Windows process end: the other threads are gone, maybe holding locks
 };
 // Process detach: tells the runtime, and refuses every later operation. While threads run it
-// closes the driver, removes the library's callbacks and stops the sessions' event workers, so
-// that nothing runs in the module when its static objects go; then it detaches the adapter from
-// the dispatcher.
+// closes the sessions the application left open and the driver, and removes the library's
+// callbacks, so that nothing runs in the module when its static objects go; then it detaches the
+// adapter from the dispatcher.
 void detachProcess(EDetach kind);
 
 // The sensor-library adapter, created on first use, destroyed at process exit.

@@ -13,6 +13,8 @@
 #include <cstring>
 #include <memory>
 #include <new>
+#include <set>
+#include <vector>
 
 namespace LbPmxPassport {
 
@@ -23,6 +25,9 @@ CNiViSv::THandle s_hVectorTable = 0;
 // Set at process detach. The module's static objects go right after it, so an operation that
 // arrives later (an exit handler of the application closing its sessions) must not reach them.
 std::atomic<bool> s_bDetached(false);
+// The objects of the open sessions, under the passport lock, so that a detach can close what the
+// application left open.
+std::set<CBasePassport*> s_cOpenObjects;
 
 LbCore::CLogger s_cLogger = LbCore::CLogManager::getLogger("CLbPmxInstrSesn");
 
@@ -93,11 +98,13 @@ ViStatus _VI_FUNC entryOpen(ViSession, ViConstRsrc name, ViAccessMode mode, ViUI
     }
     object->setVisaSession(*session, record);
     ViStatus status = object->viOpen(name, mode, timeout);
+    // The object may hold the last reference to a sensor session that it just created, whose
+    // release may close the driver: like every release, under the passport lock.
+    CPassportLock lock;
     if (status < VI_SUCCESS) {
-        // The object may hold the last reference to a sensor session that it just created, whose
-        // release may close the driver: like every release, under the passport lock.
-        CPassportLock lock;
         delete object;
+    } else {
+        s_cOpenObjects.insert(object);
     }
     return status;
 }
@@ -109,7 +116,14 @@ ViStatus _VI_FUNC entryClose(ViObject session)
         return VI_SUCCESS;
     }
     CBasePassport* object = objectOf(session);
-    return object == 0 ? VI_SUCCESS : object->viClose();
+    if (object == 0) {
+        return VI_SUCCESS;
+    }
+    {
+        CPassportLock lock;
+        s_cOpenObjects.erase(object);
+    }
+    return object->viClose();
 }
 
 ViStatus _VI_FUNC entryGetAttribute(ViObject session, ViAttr attribute, void* value)
@@ -266,22 +280,28 @@ void detachProcess(EDetach kind)
 {
     CNiViSv::detach();
     s_bDetached = true;
-    LbPmxVisa::CPmxSessionDispatcher& dispatcher = LbPmxVisa::CPmxSessionDispatcher::getInstance();
     switch (kind) {
-    case DETACH_THREADS_RUNNING:
-        // Sessions the application left open must not call into the module while its static
-        // objects are destroyed: closing the driver closes their sensors and joins the library's
-        // thread, and the callbacks stay removed even if the driver refuses to close.
+    case DETACH_THREADS_RUNNING: {
+        // Nothing may run in the module once its static objects go: the sessions the application
+        // left open are closed as by viClose, which stops their event threads and closes their
+        // sensors and, with the last one, the driver (joining the library's thread). A driver
+        // that would not close keeps no callback.
+        CPassportLock lock;
+        std::vector<CBasePassport*> objects(s_cOpenObjects.begin(), s_cOpenObjects.end());
+        s_cOpenObjects.clear();
+        for (std::size_t i = 0; i < objects.size(); ++i) {
+            objects[i]->viClose();
+        }
         if (getAdapter().isDriverOpen()) {
             getAdapter().closeDriver();
         }
         getAdapter().removeCallbacks();
-        dispatcher.stopSessions();
         LbPmxVisa::CPmxSessionDispatcher::detach(&getAdapter());
         break;
+    }
     case DETACH_UNDER_LOADER_LOCK:
-        // Joining a thread here would wait for the loader lock that this thread holds; the
-        // callbacks are removed (that waits only for a running callback).
+        // A thread cannot end while this thread holds the loader lock, so none is joined here;
+        // the callbacks are removed (that waits only for a running callback).
         getAdapter().removeCallbacks();
         LbPmxVisa::CPmxSessionDispatcher::forget(&getAdapter());
         break;

@@ -240,27 +240,6 @@ void CPmxSessionDispatcher::findAndNotify(const CPmxEvent& event, PmxNotificatio
     (listener.*operation)(event);
 }
 
-void CPmxSessionDispatcher::stopSessions()
-{
-    // Shared references keep the sessions whole while their workers stop outside the map lock (a
-    // worker may be waiting for a lock that a session's user holds while it waits for the map
-    // lock); a session already on its way out stops its own worker.
-    std::vector<boost::shared_ptr<CPmxSession> > sessions;
-    {
-        CMapGuard guard(m_cMapLock);
-        for (std::unordered_map<std::string, boost::weak_ptr<CPmxSession> >::iterator it = m_cResourceMap.begin();
-             it != m_cResourceMap.end(); ++it) {
-            boost::shared_ptr<CPmxSession> session = it->second.lock();
-            if (session) {
-                sessions.push_back(session);
-            }
-        }
-    }
-    for (std::size_t i = 0; i < sessions.size(); ++i) {
-        sessions[i]->getEventDispatcher().shutdown();
-    }
-}
-
 void CPmxSessionDispatcher::notifyCommandAcceptedEvent(const CPmxEvent& event)
 {
     findAndNotify(event, &CIPmxEventListener::notifyCommandAcceptedEvent);

@@ -8,8 +8,8 @@
 // CPmxCommandException. The maps are guarded by a lock of their own because the library's
 // callback thread reads them while application threads change them; the attached interface is
 // read on every thread and so is atomic. A sensor whose device information cannot be read
-// during enumeration (unplugged meanwhile) is skipped with a WARN line. stopSessions() and
-// forget() serve the module's detach with sessions still open.
+// during enumeration (unplugged meanwhile) is skipped with a WARN line. forget() serves a
+// detach at a process end that has stopped the other threads.
 #include "core/Lock.h"
 #include "sensor/PmxCommands.h"
 #include "sensor/PmxResourceInfo.h"
@@ -67,10 +67,6 @@ public:
     void detach(CPmxSession& session);
     void closeDriverIfIdle();
     void findAndNotify(const CPmxEvent& event, PmxNotification operation);
-    // Stops the event worker of every open session; their later events reach no one. For the
-    // module's detach, after the library's callbacks were removed: the sessions stay usable
-    // for an application thread that still holds one, but no thread of theirs runs any more.
-    void stopSessions();
 
     const std::string& getManufacturerName() const { return m_sManufacturerName; }
     std::int32_t getManufacturerId() const { return m_nManufacturerId; }
