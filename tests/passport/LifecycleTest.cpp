@@ -154,7 +154,7 @@ TEST_F(Lifecycle, AFailedOpenLeavesNoSensorSessionBehind)
 TEST_F(Lifecycle, ProcessesEndCleanlyWithSessionsOpen)
 {
 #if defined(_WIN32)
-    const int runs = 6;
+    const int runs = 10;
     const std::string probe = "passport_exit_probe.exe ";
 #else
     const int runs = 30;
