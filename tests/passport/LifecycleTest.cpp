@@ -1,7 +1,5 @@
-// Faults of the sensor library at driver and sensor open and close, discovery with a sensor that
-// cannot be read, failed opens, and processes that end with sessions open: each leaves the
-// passport working (or the process ending cleanly), through the VISA C API and the PmxSim
-// control API.
+// Library faults at driver and sensor open and close, discovery with an unreadable sensor, failed
+// opens, and processes that end with sessions open, through the VISA C API and PmxSim.
 #include "tests/passport/PassportFixture.h"
 
 #include <atomic>
@@ -76,32 +74,24 @@ TEST_F(Lifecycle, FindSkipsASensorWhoseInformationCannotBeRead)
                             "Skipping device 0, its information could not be read: Sensor has been detached"));
 }
 
-TEST_F(Lifecycle, FailedCallbackRegistrationFailsTheOpen)
+// Each fault leaves the next session working (it hears its sensor).
+TEST_F(Lifecycle, LibraryFaultsAtDriverAndSensorOpenAndCloseRecover)
 {
+    // Without a callback the session would never hear anything: the open fails.
     ViSession session = VI_NULL;
-    ASSERT_EQ(0, PmxSimFailNext("PmxSetNotifyCallbackCommandAccepted", kFault));
-    EXPECT_EQ(VI_ERROR_RSRC_NFOUND, viOpen(m_nRm, kFirst, VI_NULL, 0, &session));
-    EXPECT_FALSE(driverOpen());
-    ASSERT_EQ(0, PmxSimFailNext("PmxSetNotifyCallbackDataAvailable", kFault));
-    EXPECT_EQ(VI_ERROR_RSRC_NFOUND, viOpen(m_nRm, kFirst, VI_NULL, 0, &session));
+    for (const char* registration : {"PmxSetNotifyCallbackCommandAccepted", "PmxSetNotifyCallbackDataAvailable"}) {
+        ASSERT_EQ(0, PmxSimFailNext(registration, kFault));
+        EXPECT_EQ(VI_ERROR_RSRC_NFOUND, viOpen(m_nRm, kFirst, VI_NULL, 0, &session));
+        EXPECT_FALSE(driverOpen());
+    }
 
+    // A driver that would not close, at the last close or at the end of a discovery.
+    session = open(kFirst);
+    ASSERT_EQ(0, PmxSimFailNext("PmxCloseDriver", kFault));
+    viClose(session);
     session = open(kFirst);
     expectWorking(session);
     viClose(session);
-    EXPECT_FALSE(driverOpen());
-}
-
-TEST_F(Lifecycle, AfterAFailedDriverCloseTheNextSessionHears)
-{
-    ViSession session = open(kFirst);
-    ASSERT_EQ(0, PmxSimFailNext("PmxCloseDriver", kFault));
-    EXPECT_EQ(VI_SUCCESS, viClose(session));
-    session = open(kFirst);
-    expectWorking(session);
-    EXPECT_EQ(VI_SUCCESS, viClose(session));
-    EXPECT_FALSE(driverOpen());
-
-    // The same after the close at the end of a discovery.
     ViFindList list = VI_NULL;
     ViUInt32 count = 0;
     ViChar name[VI_FIND_BUFLEN] = {0};
@@ -110,19 +100,14 @@ TEST_F(Lifecycle, AfterAFailedDriverCloseTheNextSessionHears)
     viClose(list);
     session = open(kFirst);
     expectWorking(session);
-    viClose(session);
-}
 
-TEST_F(Lifecycle, AfterAFailedSensorCloseTheSensorOpensAgain)
-{
-    ViSession first = open(kFirst);
+    // A sensor that would not close while another one keeps the driver open.
     ViSession second = open(kSecond);
     ASSERT_EQ(0, PmxSimFailNext("PmxCloseSensor", kFault));
-    EXPECT_EQ(VI_SUCCESS, viClose(first));
-    first = open(kFirst);
-    expectWorking(first);
-    expectWorking(second);
-    viClose(first);
+    viClose(session);
+    session = open(kFirst);
+    expectWorking(session);
+    viClose(session);
     viClose(second);
     EXPECT_FALSE(driverOpen());
 }
@@ -140,11 +125,6 @@ TEST_F(Lifecycle, AFailedOpenLeavesNoSensorSessionBehind)
     EXPECT_EQ(VI_ERROR_SYSTEM_ERROR, viOpen(m_nRm, kFirst, VI_NULL, 0, &session));
     EXPECT_FALSE(driverOpen());
     EXPECT_TRUE(logContains("[ERROR] CLbPmxInstrSesn - LbPmxPassport::CLbPmxInstrSesn::viOpen - No session record for session "));
-
-    session = open(kFirst);
-    expectWorking(session);
-    viClose(session);
-    EXPECT_FALSE(driverOpen());
 }
 #endif
 

@@ -227,22 +227,6 @@ TEST_F(PmxControlTest, FailedCloseDriverStaysOpenAndKeepsReporting)
     EXPECT_TRUE(m_cControl.isDriverOpen());
 }
 
-TEST_F(PmxControlTest, FailedRegistrationFailsTheOpenAndRemovedCallbacksStaySilent)
-{
-    ASSERT_EQ(0, PmxSimFailNext("PmxSetNotifyCallbackDataAvailable", 0x7777));
-    EXPECT_EQ(0x7777, m_cControl.openDriver());
-    EXPECT_FALSE(m_cControl.isDriverOpen());
-    std::int32_t count = 0;
-    EXPECT_EQ(PMXSIM_E_DRIVER_NOT_OPEN, PmxGetDeviceListLength(&count)) << "the driver was closed again";
-
-    ASSERT_EQ(0, m_cControl.openDriver());
-    m_cControl.removeCallbacks();
-    ASSERT_EQ(0, PmxSimReportError(nullptr, 0x2222));
-    ASSERT_TRUE(drainEvents("2"));
-    EXPECT_TRUE(m_cRecorder.notes().empty());
-    EXPECT_TRUE(m_cControl.isDriverOpen());
-}
-
 TEST_F(PmxControlTest, PerSensorOperationsUseTheSessionHandle)
 {
     CPmxSession& session = openSession();
