@@ -9,12 +9,12 @@
 // result. Callbacks are installed exactly while the driver is open: a registration that fails
 // closes the driver again and fails the open, and a failed close leaves the flag set with the
 // callbacks installed again, so the open driver keeps reporting. A sensor whose close failed is
-// closed again before it is next opened, so a failed close does not keep it from the next
-// session. removeCallbacks() is for unloading: afterwards no callback reaches the adapter, whatever
-// the driver's state. The callbacks arrive on the library's thread and are
-// handed on that thread to the listener stored at that moment (dropped when there is none); the
-// benign error code 0xD0000007 is never forwarded. The adapter never throws, never logs, and its
-// destruction makes no library call.
+// closed again before it is next opened, so the failure does not keep it from the next session.
+// removeCallbacks() is for unloading: afterwards no callback reaches the adapter, whatever the
+// driver's state. The callbacks arrive on the library's thread and are handed on that thread to
+// the listener stored at that moment (dropped when there is none); the benign error code
+// 0xD0000007 is never forwarded. The adapter never throws, never logs, and its destruction makes
+// no library call.
 #include "core/ThreadSafety.h"
 #include "sensor/PmxCommands.h"
 
