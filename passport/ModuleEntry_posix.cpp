@@ -35,7 +35,7 @@ namespace {
 // an operation to the passport, so a failed attach leaves it inert.
 struct CModuleEntry {
     CModuleEntry() { attachProcess(); }
-    ~CModuleEntry() { detachProcess(); }
+    ~CModuleEntry() { detachProcess(DETACH_THREADS_RUNNING); }
 };
 
 CModuleEntry s_cModuleEntry;

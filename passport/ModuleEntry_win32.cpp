@@ -23,11 +23,16 @@ bool queryConfigurationValue(const char* name, char (&buffer)[80], unsigned& siz
 
 } // namespace LbPmxPassport
 
-extern "C" BOOL WINAPI DllMain(HINSTANCE, DWORD reason, LPVOID)
+// A non-null reserved argument at detach means the process ends: the system has already stopped
+// every other thread.
+extern "C" BOOL WINAPI DllMain(HINSTANCE, DWORD reason, LPVOID reserved)
 {
     switch (reason) {
     case DLL_PROCESS_ATTACH: return LbPmxPassport::attachProcess() ? TRUE : FALSE;
-    case DLL_PROCESS_DETACH: LbPmxPassport::detachProcess(); return TRUE;
+    case DLL_PROCESS_DETACH:
+        LbPmxPassport::detachProcess(reserved != 0 ? LbPmxPassport::DETACH_THREADS_STOPPED
+                                                   : LbPmxPassport::DETACH_UNDER_LOADER_LOCK);
+        return TRUE;
     default: return TRUE;
     }
 }

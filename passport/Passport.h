@@ -29,8 +29,17 @@ public:
 // Process attach: lock, vector table, configuration, adapter attached to the dispatcher.
 // False when the lock or the vector table could not be created.
 bool attachProcess();
-// Process detach: tells the runtime, detaches the adapter from the dispatcher.
-void detachProcess();
+// How the module is detached, which decides what the detach may still wait for.
+enum EDetach {
+    DETACH_THREADS_RUNNING,   // POSIX unload or exit: every thread still runs
+    DETACH_UNDER_LOADER_LOCK, // Windows unload while the process runs: no thread can end now
+    DETACH_THREADS_STOPPED    // Windows process end: the other threads are gone, maybe holding locks
+};
+// Process detach: tells the runtime, and refuses every later operation. While threads run it
+// closes the sessions the application left open and the driver, and removes the library's
+// callbacks, so that nothing runs in the module when its static objects go; then it detaches the
+// adapter from the dispatcher.
+void detachProcess(EDetach kind);
 
 // The sensor-library adapter, created on first use, destroyed at process exit.
 LbPmxVisa::CPmxControl& getAdapter();

@@ -4,11 +4,17 @@
 #include "passport/LbPmxInstrSesn.h"
 #include "passport/Passport.h"
 #include "sensor/PmxControl.h"
+#include "sensor/PmxDataSerializer.h"
+#include "sensor/PmxScpiCommandParser.h"
 #include "sensor/PmxSessionDispatcher.h"
+#include "sensor/PmxSessionState.h"
 
+#include <atomic>
 #include <cstring>
 #include <memory>
 #include <new>
+#include <set>
+#include <vector>
 
 namespace LbPmxPassport {
 
@@ -16,6 +22,14 @@ namespace {
 
 CNiViSv::THandle s_hPassportLock = 0;
 CNiViSv::THandle s_hVectorTable = 0;
+// Set at process detach. The module's static objects go right after it, so an operation that
+// arrives later (an exit handler of the application closing its sessions) must not reach them.
+std::atomic<bool> s_bDetached(false);
+// The objects of the open sessions, under the passport lock, so that a detach can close what the
+// application left open.
+std::set<CBasePassport*> s_cOpenObjects;
+
+LbCore::CLogger s_cLogger = LbCore::CLogManager::getLogger("CLbPmxInstrSesn");
 
 // The object the runtime's record of a session holds in the passport's slot, or null.
 CBasePassport* objectOf(ViSession session)
@@ -26,26 +40,39 @@ CBasePassport* objectOf(ViSession session)
 
 // Each entry function forwards to the session's object. A handle without an object (never
 // opened, or already closed) answers VI_ERROR_INV_OBJECT instead of touching a null pointer.
+// After detach: VI_ERROR_SYSTEM_ERROR.
 template <class F>
 ViStatus forward(ViSession session, F call)
 {
+    if (s_bDetached) {
+        return VI_ERROR_SYSTEM_ERROR;
+    }
     CBasePassport* object = objectOf(session);
     return object == 0 ? VI_ERROR_INV_OBJECT : call(*object);
 }
 
 ViStatus _VI_FUNC entryFindRsrc(ViSession rm, ViConstString expression, ViPFindList findList)
 {
+    if (s_bDetached) {
+        return VI_ERROR_SYSTEM_ERROR;
+    }
     return CLbPmxInstrSesn::viFindRsrc(rm, expression, findList);
 }
 
 ViStatus _VI_FUNC entryParseRsrc(ViSession rm, ViConstRsrc name, ViPUInt16 type, ViPUInt16 number)
 {
+    if (s_bDetached) {
+        return VI_ERROR_SYSTEM_ERROR;
+    }
     return CLbPmxInstrSesn::viParseRsrc(rm, name, type, number);
 }
 
 ViStatus _VI_FUNC entryParseRsrcEx(ViSession rm, ViConstRsrc name, ViPUInt16 type, ViPUInt16 number,
                                    ViChar resourceClass[], ViChar expandedName[], ViChar alias[])
 {
+    if (s_bDetached) {
+        return VI_ERROR_SYSTEM_ERROR;
+    }
     return CLbPmxInstrSesn::viParseRsrcEx(rm, name, type, number, resourceClass, expandedName, alias);
 }
 
@@ -54,22 +81,49 @@ ViStatus _VI_FUNC entryOpen(ViSession, ViConstRsrc name, ViAccessMode mode, ViUI
     if (session == 0) {
         return VI_ERROR_INV_PARAMETER;
     }
+    if (s_bDetached) {
+        return VI_ERROR_SYSTEM_ERROR;
+    }
+    // Without the runtime's record the object could never be reached again (nor closed, nor
+    // counted out of the open sensor sessions): the open fails before anything is opened.
+    ViAddr* record = CNiViSv::sessionRecord(*session);
+    if (record == 0) {
+        s_cLogger.error() << "LbPmxPassport::CLbPmxInstrSesn::viOpen" << " - " << "No session record for session "
+                          << *session;
+        return VI_ERROR_SYSTEM_ERROR;
+    }
     CLbPmxInstrSesn* object = new (std::nothrow) CLbPmxInstrSesn();
     if (object == 0) {
         return VI_ERROR_ALLOC;
     }
-    object->setVisaSession(*session, CNiViSv::sessionRecord(*session));
+    object->setVisaSession(*session, record);
     ViStatus status = object->viOpen(name, mode, timeout);
+    // The object may hold the last reference to a sensor session that it just created, whose
+    // release may close the driver: like every release, under the passport lock.
+    CPassportLock lock;
     if (status < VI_SUCCESS) {
         delete object;
+    } else {
+        s_cOpenObjects.insert(object);
     }
     return status;
 }
 
 ViStatus _VI_FUNC entryClose(ViObject session)
 {
+    // After detach the object stays: what it would release is already gone.
+    if (s_bDetached) {
+        return VI_SUCCESS;
+    }
     CBasePassport* object = objectOf(session);
-    return object == 0 ? VI_SUCCESS : object->viClose();
+    if (object == 0) {
+        return VI_SUCCESS;
+    }
+    {
+        CPassportLock lock;
+        s_cOpenObjects.erase(object);
+    }
+    return object->viClose();
 }
 
 ViStatus _VI_FUNC entryGetAttribute(ViObject session, ViAttr attribute, void* value)
@@ -189,6 +243,25 @@ LbPmxVisa::CPmxControl& getAdapter()
     return s_cAdapter;
 }
 
+namespace {
+// Process-wide objects that sessions use on their worker threads are built here, before the
+// module entry's own static object, so that at process exit they are destroyed only after the
+// detach has stopped those threads.
+void buildProcessWideObjects()
+{
+    using LbPmxVisa::CIPmxSessionState;
+    CIPmxSessionState::noData();
+    CIPmxSessionState::waitingForData();
+    CIPmxSessionState::dataAvailable();
+    CIPmxSessionState::errorQueueToNoData();
+    CIPmxSessionState::errorQueueToPmxDataAvailable();
+    CIPmxSessionState::opStatusToNoData();
+    CIPmxSessionState::opStatusToPmxDataAvailable();
+    LbPmxVisa::CPmxScpiCommandParser::getInstance();
+    LbPmxVisa::CPmxDataSerializerFactory::getInstance();
+}
+} // namespace
+
 bool attachProcess()
 {
     if (CNiViSv::createLock("LbPmxPassport C++ Passport Semaphore", 1, 1, &s_hPassportLock) < VI_SUCCESS) {
@@ -198,14 +271,44 @@ bool attachProcess()
         return false;
     }
     readConfiguration();
+    buildProcessWideObjects();
     LbPmxVisa::CPmxSessionDispatcher::attach(&getAdapter());
     return true;
 }
 
-void detachProcess()
+void detachProcess(EDetach kind)
 {
     CNiViSv::detach();
-    LbPmxVisa::CPmxSessionDispatcher::detach(&getAdapter());
+    s_bDetached = true;
+    switch (kind) {
+    case DETACH_THREADS_RUNNING: {
+        // Nothing may run in the module once its static objects go: the sessions the application
+        // left open are closed as by viClose, which stops their event threads and closes their
+        // sensors and, with the last one, the driver (joining the library's thread). A driver
+        // that would not close keeps no callback.
+        CPassportLock lock;
+        std::vector<CBasePassport*> objects(s_cOpenObjects.begin(), s_cOpenObjects.end());
+        s_cOpenObjects.clear();
+        for (std::size_t i = 0; i < objects.size(); ++i) {
+            objects[i]->viClose();
+        }
+        if (getAdapter().isDriverOpen()) {
+            getAdapter().closeDriver();
+        }
+        getAdapter().removeCallbacks();
+        LbPmxVisa::CPmxSessionDispatcher::detach(&getAdapter());
+        break;
+    }
+    case DETACH_UNDER_LOADER_LOCK:
+        // A thread cannot end while this thread holds the loader lock, so none is joined here;
+        // the callbacks are removed (that waits only for a running callback).
+        getAdapter().removeCallbacks();
+        LbPmxVisa::CPmxSessionDispatcher::forget(&getAdapter());
+        break;
+    case DETACH_THREADS_STOPPED:
+        LbPmxVisa::CPmxSessionDispatcher::forget(&getAdapter());
+        break;
+    }
 }
 
 // ---- configuration

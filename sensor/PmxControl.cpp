@@ -22,27 +22,61 @@ void CPmxControl::setEventListener(CIPmxEventListener* listener)
 std::int32_t CPmxControl::openDriver()
 {
     std::int32_t result = PmxOpenDriver();
-    if (result == 0) {
-        m_bDriverOpen = true;
-        PmxSetNotifyCallbackCommandAccepted(&CPmxControl::onCommandAccepted, this);
-        PmxSetNotifyCallbackStateChanged(&CPmxControl::onStateChanged, this);
-        PmxSetNotifyCallbackDataAvailable(&CPmxControl::onDataAvailable, this);
-        PmxSetNotifyCallbackErrorOccurred(&CPmxControl::onErrorOccurred, this);
-        PmxSetNotifyCallbackDeviceChanged(&CPmxControl::onDeviceChanged, this);
+    if (result != 0) {
+        return result;
+    }
+    // A driver whose callbacks could not all be installed would never report anything: the open
+    // fails with the registration's result and the driver is closed again.
+    result = installCallbacks();
+    if (result != 0) {
+        removeCallbacks();
+        PmxCloseDriver();
+        return result;
+    }
+    m_bDriverOpen = true;
+    return 0;
+}
+
+std::int32_t CPmxControl::closeDriver()
+{
+    removeCallbacks();
+    std::int32_t result = PmxCloseDriver();
+    m_bDriverOpen = result != 0;
+    if (result != 0) {
+        // The driver stays open, so it keeps its callbacks: the next session must hear it.
+        installCallbacks();
+    } else {
+        // Closing the driver closed every sensor.
+        LbCore::CMutexLock lock(m_cUnclosedLock);
+        m_cUnclosed.clear();
     }
     return result;
 }
 
-std::int32_t CPmxControl::closeDriver()
+std::int32_t CPmxControl::installCallbacks()
+{
+    std::int32_t results[] = {
+        PmxSetNotifyCallbackCommandAccepted(&CPmxControl::onCommandAccepted, this),
+        PmxSetNotifyCallbackStateChanged(&CPmxControl::onStateChanged, this),
+        PmxSetNotifyCallbackDataAvailable(&CPmxControl::onDataAvailable, this),
+        PmxSetNotifyCallbackErrorOccurred(&CPmxControl::onErrorOccurred, this),
+        PmxSetNotifyCallbackDeviceChanged(&CPmxControl::onDeviceChanged, this),
+    };
+    for (std::int32_t result : results) {
+        if (result != 0) {
+            return result;
+        }
+    }
+    return 0;
+}
+
+void CPmxControl::removeCallbacks()
 {
     PmxSetNotifyCallbackCommandAccepted(nullptr, nullptr);
     PmxSetNotifyCallbackStateChanged(nullptr, nullptr);
     PmxSetNotifyCallbackDataAvailable(nullptr, nullptr);
     PmxSetNotifyCallbackErrorOccurred(nullptr, nullptr);
     PmxSetNotifyCallbackDeviceChanged(nullptr, nullptr);
-    std::int32_t result = PmxCloseDriver();
-    m_bDriverOpen = result != 0;
-    return result;
 }
 
 bool CPmxControl::isDriverOpen()
@@ -53,12 +87,26 @@ bool CPmxControl::isDriverOpen()
 std::int32_t CPmxControl::openSensor(const CPmxResourceInfo& resource, std::int64_t* handle)
 {
     std::string descriptor = g_pcPmxSerializer->serialize(resource);
+    {
+        // The library may still hold the sensor under a handle whose close failed; it is
+        // released now (and tried again next time if that fails too).
+        LbCore::CMutexLock lock(m_cUnclosedLock);
+        std::map<std::string, std::int64_t>::iterator unclosed = m_cUnclosed.find(descriptor);
+        if (unclosed != m_cUnclosed.end() && PmxCloseSensor(unclosed->second) == 0) {
+            m_cUnclosed.erase(unclosed);
+        }
+    }
     return PmxOpenSensor(descriptor.c_str(), handle);
 }
 
 std::int32_t CPmxControl::closeSensor(CPmxSession& session)
 {
-    return PmxCloseSensor(session.getHandle());
+    std::int32_t result = PmxCloseSensor(session.getHandle());
+    if (result != 0) {
+        LbCore::CMutexLock lock(m_cUnclosedLock);
+        m_cUnclosed[g_pcPmxSerializer->serialize(session.getResourceInfo())] = session.getHandle();
+    }
+    return result;
 }
 
 std::int32_t CPmxControl::sendCommand(CPmxSession& session, const std::string& text)

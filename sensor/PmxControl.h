@@ -6,13 +6,20 @@
 // session given. openDriver installs the five callbacks (command accepted, state changed, data
 // available, error occurred, device changed) when the library opened its driver; closeDriver
 // removes them in the same order before closing it, and the driver-open flag follows the close
-// result (a failed close leaves it set). The callbacks arrive on the library's thread and are
-// handed on that thread to the listener stored at that moment (dropped when there is none); the
-// benign error code 0xD0000007 is never forwarded. The adapter never throws, never logs, and its
-// destruction makes no library call.
+// result. Callbacks are installed exactly while the driver is open: a registration that fails
+// closes the driver again and fails the open, and a failed close leaves the flag set with the
+// callbacks installed again, so the open driver keeps reporting. A sensor whose close failed is
+// closed again before it is next opened, so the failure does not keep it from the next session.
+// removeCallbacks() is for unloading: afterwards no callback reaches the adapter, whatever the
+// driver's state. The callbacks arrive on the library's thread and are handed on that thread to
+// the listener stored at that moment (dropped when there is none); the benign error code
+// 0xD0000007 is never forwarded. The adapter never throws, never logs, and its destruction makes
+// no library call.
+#include "core/ThreadSafety.h"
 #include "sensor/PmxCommands.h"
 
 #include <atomic>
+#include <map>
 
 namespace LbPmxVisa {
 
@@ -43,6 +50,9 @@ public:
     std::int32_t getDeviceListLength(std::int32_t* count) override;
     std::int32_t getDeviceInfo(std::int32_t index, std::string& name, std::string& type, std::string& serial, std::int32_t* flag) override;
 
+    // Removes the five callbacks; when it returns no callback runs in the adapter any more.
+    void removeCallbacks();
+
 private:
     CPmxControl(const CPmxControl&) = delete;
     CPmxControl& operator=(const CPmxControl&) = delete;
@@ -53,6 +63,11 @@ private:
     static void onErrorOccurred(std::int64_t handle, std::int32_t code, void* user);
     static void onDeviceChanged(void* user);
     void forward(PmxNotification notification, std::int64_t handle, std::int32_t value);
+    std::int32_t installCallbacks();
+
+    // Handles the library refused to close, by sensor descriptor.
+    LbCore::CMutex m_cUnclosedLock;
+    std::map<std::string, std::int64_t> m_cUnclosed GUARDED_BY(m_cUnclosedLock);
 
     // Atomic: written by application threads, read on the library's callback thread.
     std::atomic<bool> m_bDriverOpen;

@@ -37,8 +37,9 @@ CPmxSessionDispatcher::CPmxSessionDispatcher()
 
 CPmxSessionDispatcher::~CPmxSessionDispatcher()
 {
-    if (m_pcCommand != 0) {
-        detach(m_pcCommand);
+    CIPmxCommands* commands = m_pcCommand;
+    if (commands != 0) {
+        detach(commands);
     }
 }
 
@@ -76,12 +77,18 @@ void CPmxSessionDispatcher::detach(CIPmxCommands* commands)
     self.m_pcCommand = 0;
 }
 
+void CPmxSessionDispatcher::forget(CIPmxCommands* commands)
+{
+    getInstance().m_pcCommand.compare_exchange_strong(commands, 0);
+}
+
 CIPmxCommands* CPmxSessionDispatcher::getCommands()
 {
-    if (m_pcCommand == 0) {
+    CIPmxCommands* commands = m_pcCommand;
+    if (commands == 0) {
         throw std::runtime_error("No configuration has been set. Use method attach(...) for set a configuration");
     }
-    return m_pcCommand;
+    return commands;
 }
 
 boost::shared_ptr<CPmxSession> CPmxSessionDispatcher::getSession(const CPmxResourceInfo& resource)
@@ -148,7 +155,15 @@ std::vector<CPmxResourceInfo> CPmxSessionDispatcher::getAvailableDevices()
         std::string type;
         std::string serial;
         std::int32_t flag = 0;
-        callChecked(&CIPmxCommands::getDeviceInfo, index, name, type, serial, &flag);
+        // A sensor unplugged while the list is read has no information any more; the others
+        // are still worth listing.
+        try {
+            callChecked(&CIPmxCommands::getDeviceInfo, index, name, type, serial, &flag);
+        } catch (const CPmxCommandException& e) {
+            s_cLogger.warn() << "LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices" << " - " << "Skipping device "
+                             << index << ", its information could not be read: " << e.what();
+            continue;
+        }
         s_cLogger.debug() << "LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices" << " - " << "Adding device "
                           << type << ";" << serial;
         if (flag == 0) {

@@ -6,7 +6,10 @@
 // enumerates attached sensors, and routes every library callback to the session registered
 // under the callback's sensor handle. callChecked() turns a non-zero library result into
 // CPmxCommandException. The maps are guarded by a lock of their own because the library's
-// callback thread reads them while application threads change them.
+// callback thread reads them while application threads change them; the attached interface is
+// read on every thread and so is atomic. A sensor whose device information cannot be read
+// during enumeration (unplugged meanwhile) is skipped with a WARN line. forget() serves a
+// detach at a process end that has stopped the other threads.
 #include "core/Lock.h"
 #include "sensor/PmxCommands.h"
 #include "sensor/PmxResourceInfo.h"
@@ -14,6 +17,7 @@
 #include <boost/noncopyable.hpp>
 #include <boost/shared_ptr.hpp>
 #include <boost/weak_ptr.hpp>
+#include <atomic>
 #include <cstdint>
 #include <exception>
 #include <string>
@@ -40,6 +44,9 @@ public:
     static CPmxSessionDispatcher& getInstance();
     static void attach(CIPmxCommands* commands);
     static void detach(CIPmxCommands* commands);
+    // Like detach, but takes no lock and logs nothing: for a process end where the system
+    // stopped the other threads, perhaps while they held a lock.
+    static void forget(CIPmxCommands* commands);
 
     // Throws std::runtime_error when no commands interface is attached.
     CIPmxCommands* getCommands();
@@ -76,7 +83,7 @@ private:
 
     std::unordered_map<std::string, boost::weak_ptr<CPmxSession> > m_cResourceMap;
     std::unordered_map<std::int64_t, CPmxSession*> m_cSessionMap;
-    CIPmxCommands* m_pcCommand;
+    std::atomic<CIPmxCommands*> m_pcCommand;
     std::string m_sManufacturerName;
     std::int32_t m_nManufacturerId;
     LbCore::CCriticalSection m_cMapLock;
