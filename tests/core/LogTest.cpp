@@ -8,6 +8,7 @@
 #include <cstdlib>
 #include <ctime>
 #include <fstream>
+#include <new>
 #include <regex>
 #include <stdexcept>
 #include <thread>
@@ -15,19 +16,39 @@
 using namespace LbCore;
 
 // Every allocation of this test program is counted, so a case can check that an operation
-// allocates nothing.
+// allocates nothing. All forms are replaced, so that sanitizers see matching pairs.
 static std::atomic<unsigned long> s_nAllocations(0);
+
+static void* countedAllocation(std::size_t size) noexcept
+{
+    ++s_nAllocations;
+    return std::malloc(size == 0 ? 1 : size);
+}
 
 void* operator new(std::size_t size)
 {
-    ++s_nAllocations;
-    if (void* memory = std::malloc(size == 0 ? 1 : size)) {
+    if (void* memory = countedAllocation(size)) {
         return memory;
     }
     throw std::bad_alloc();
 }
+void* operator new[](std::size_t size) { return operator new(size); }
+void* operator new(std::size_t size, const std::nothrow_t&) noexcept { return countedAllocation(size); }
+void* operator new[](std::size_t size, const std::nothrow_t&) noexcept { return countedAllocation(size); }
+// GCC takes free() after an inlined operator new for a mismatch; here both are malloc's.
+#if defined(__GNUC__) && !defined(__clang__)
+#pragma GCC diagnostic push
+#pragma GCC diagnostic ignored "-Wmismatched-new-delete"
+#endif
 void operator delete(void* memory) noexcept { std::free(memory); }
 void operator delete(void* memory, std::size_t) noexcept { std::free(memory); }
+void operator delete[](void* memory) noexcept { std::free(memory); }
+void operator delete[](void* memory, std::size_t) noexcept { std::free(memory); }
+void operator delete(void* memory, const std::nothrow_t&) noexcept { std::free(memory); }
+void operator delete[](void* memory, const std::nothrow_t&) noexcept { std::free(memory); }
+#if defined(__GNUC__) && !defined(__clang__)
+#pragma GCC diagnostic pop
+#endif
 
 namespace {
 
