@@ -1,6 +1,7 @@
 // Baselines of this machine: what hand-offs between threads cost, measured in the same run as
 // the operations, so that the ratios cancel out the machine's speed and its current load.
 #include "core/Semaphore.h"
+#include "core/Thread.h"
 
 #include <benchmark/benchmark.h>
 
@@ -147,5 +148,24 @@ void BM_SemaphorePairs(benchmark::State& state)
     state.SetItemsProcessed(state.iterations());
 }
 BENCHMARK(BM_SemaphorePairs)->Threads(1)->Threads(4)->UseRealTime();
+
+// Starting a worker thread and waiting for its end: part of every session opening.
+void BM_ThreadStartJoin(benchmark::State& state)
+{
+    class CNothing : public LbCore::CIRunnable {
+        bool init() override { return true; }
+        bool run() override { return false; }
+        void cleanup() override {}
+    };
+    CNothing nothing;
+    for (auto _ : state) {
+        LbCore::CThread thread(nothing);
+        if (thread.start() != 0 || thread.join(LbCore::CSemaphore::INFINITE_WAIT) != 0) {
+            state.SkipWithError("thread start failed");
+            break;
+        }
+    }
+}
+BENCHMARK(BM_ThreadStartJoin)->UseRealTime();
 
 } // namespace

@@ -38,6 +38,7 @@ def scaling(prefix):
 rows = [
     ("semaphore ping-pong (baseline)", "BM_SemaphorePingPong/real_time", None),
     ("three-thread ring (baseline)", "BM_Ring/real_time", None),
+    ("thread start + join (baseline)", "BM_ThreadStartJoin/real_time", None),
     ("acknowledged write", "BM_AcknowledgedWrite/real_time", ("ratio", 1.2, "allocs", 8)),
     ("*IDN? query", "BM_IdnQuery/real_time", ("ratio", 1.35)),
     ("trigger + FETCh? + read", "BM_TriggerFetchRead/real_time", ("ratio", 1.6)),
