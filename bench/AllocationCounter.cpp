@@ -2,6 +2,7 @@
 
 #include <atomic>
 #include <cstddef>
+#include <sys/resource.h>
 
 // glibc's allocator under its own names: the process's malloc family is replaced by counting
 // wrappers around it (glibc supports replacing malloc in the executable), so free() of glibc
@@ -39,6 +40,15 @@ namespace LbBench {
 std::uint64_t allocationCount()
 {
     return s_nAllocations.load(std::memory_order_relaxed);
+}
+
+std::uint64_t contextSwitchCount()
+{
+    struct rusage usage;
+    if (getrusage(RUSAGE_SELF, &usage) != 0) {
+        return 0;
+    }
+    return static_cast<std::uint64_t>(usage.ru_nvcsw) + static_cast<std::uint64_t>(usage.ru_nivcsw);
 }
 
 } // namespace LbBench

@@ -1,5 +1,6 @@
 // Baselines of this machine: what hand-offs between threads cost, measured in the same run as
 // the operations, so that the ratios cancel out the machine's speed and its current load.
+#include "bench/AllocationCounter.h"
 #include "core/Semaphore.h"
 #include "core/Thread.h"
 
@@ -120,20 +121,22 @@ private:
 void BM_SemaphorePingPong(benchmark::State& state)
 {
     CPingPong pair;
+    LbBench::COperationCounters counters;
     for (auto _ : state) {
         pair.roundTrip();
     }
-    state.SetItemsProcessed(state.iterations());
+    counters.report(state);
 }
 BENCHMARK(BM_SemaphorePingPong)->UseRealTime();
 
 void BM_Ring(benchmark::State& state)
 {
     CRing ring;
+    LbBench::COperationCounters counters;
     for (auto _ : state) {
         ring.roundTrip();
     }
-    state.SetItemsProcessed(state.iterations());
+    counters.report(state);
 }
 BENCHMARK(BM_Ring)->UseRealTime();
 

@@ -48,20 +48,6 @@ bool read(ViSession vi, std::vector<ViByte>& buffer, ViUInt32 minimum = 1)
     return viRead(vi, buffer.data(), static_cast<ViUInt32>(buffer.size()), &count) == VI_SUCCESS && count >= minimum;
 }
 
-// Allocations per iteration from construction until report().
-class CAllocations {
-public:
-    CAllocations() : m_nStart(allocationCount()) {}
-    void report(benchmark::State& state)
-    {
-        state.counters["allocs"] =
-            benchmark::Counter(static_cast<double>(allocationCount() - m_nStart), benchmark::Counter::kAvgIterations);
-    }
-
-private:
-    std::uint64_t m_nStart;
-};
-
 #define LB_REQUIRE(state, condition)                                                                                   \
     if (!(condition)) {                                                                                                \
         (state).SkipWithError("failed: " #condition);                                                                  \
@@ -75,11 +61,11 @@ void BM_AcknowledgedWrite(benchmark::State& state)
         state.SkipWithError("viOpen failed");
         return;
     }
-    CAllocations allocations;
+    COperationCounters counters;
     for (auto _ : state) {
         LB_REQUIRE(state, write(session, "FUNC POWER"));
     }
-    allocations.report(state);
+    counters.report(state);
 }
 BENCHMARK(BM_AcknowledgedWrite)->UseRealTime();
 
@@ -91,12 +77,12 @@ void BM_IdnQuery(benchmark::State& state)
         state.SkipWithError("viOpen failed");
         return;
     }
-    CAllocations allocations;
+    COperationCounters counters;
     for (auto _ : state) {
         LB_REQUIRE(state, write(session, "*IDN?"));
         LB_REQUIRE(state, read(session, buffer));
     }
-    allocations.report(state);
+    counters.report(state);
 }
 BENCHMARK(BM_IdnQuery)->UseRealTime();
 
@@ -108,13 +94,13 @@ void BM_TriggerFetchRead(benchmark::State& state)
         state.SkipWithError("viOpen failed");
         return;
     }
-    CAllocations allocations;
+    COperationCounters counters;
     for (auto _ : state) {
         LB_REQUIRE(state, viAssertTrigger(session, VI_TRIG_PROT_DEFAULT) == VI_SUCCESS);
         LB_REQUIRE(state, write(session, "FETCh?"));
         LB_REQUIRE(state, read(session, buffer));
     }
-    allocations.report(state);
+    counters.report(state);
 }
 BENCHMARK(BM_TriggerFetchRead)->UseRealTime();
 
@@ -128,13 +114,13 @@ void BM_Trace1024(benchmark::State& state)
         state.SkipWithError("setting up the trace failed");
         return;
     }
-    CAllocations allocations;
+    COperationCounters counters;
     for (auto _ : state) {
         LB_REQUIRE(state, viAssertTrigger(session, VI_TRIG_PROT_DEFAULT) == VI_SUCCESS);
         LB_REQUIRE(state, write(session, "FETCh?"));
         LB_REQUIRE(state, read(session, buffer, 4 * 1024));
     }
-    allocations.report(state);
+    counters.report(state);
     write(session, "*RST");
 }
 BENCHMARK(BM_Trace1024)->UseRealTime();
@@ -146,12 +132,12 @@ void BM_ReadSTB(benchmark::State& state)
         state.SkipWithError("viOpen failed");
         return;
     }
-    CAllocations allocations;
+    COperationCounters counters;
     for (auto _ : state) {
         ViUInt16 status = 0;
         LB_REQUIRE(state, viReadSTB(session, &status) == VI_SUCCESS);
     }
-    allocations.report(state);
+    counters.report(state);
 }
 BENCHMARK(BM_ReadSTB)->UseRealTime();
 
@@ -160,7 +146,7 @@ BENCHMARK(BM_ReadSTB)->UseRealTime();
 // allocations are those of open and close together.
 void BM_OpenSession(benchmark::State& state)
 {
-    CAllocations allocations;
+    COperationCounters counters;
     for (auto _ : state) {
         ViSession vi = VI_NULL;
         LB_REQUIRE(state, viOpen(resourceManager(), sensorName(0).c_str(), VI_NULL, 0, &vi) == VI_SUCCESS);
@@ -169,7 +155,7 @@ void BM_OpenSession(benchmark::State& state)
         state.ResumeTiming();
         LB_REQUIRE(state, closed == VI_SUCCESS);
     }
-    allocations.report(state);
+    counters.report(state);
 }
 BENCHMARK(BM_OpenSession)->UseRealTime();
 
@@ -226,7 +212,7 @@ void BM_SrqCycle(benchmark::State& state)
     }
     const unsigned long kRequestsPerCycle = 3;
     unsigned long expected = 0;
-    CAllocations allocations;
+    COperationCounters counters;
     for (auto _ : state) {
         LB_REQUIRE(state, viAssertTrigger(session, VI_TRIG_PROT_DEFAULT) == VI_SUCCESS);
         LB_REQUIRE(state, write(session, "FETCh?"));
@@ -234,7 +220,7 @@ void BM_SrqCycle(benchmark::State& state)
         expected += kRequestsPerCycle;
         LB_REQUIRE(state, counter.waitFor(expected));
     }
-    allocations.report(state);
+    counters.report(state);
     viDisableEvent(session, VI_EVENT_SERVICE_REQ, VI_HNDLR);
     viUninstallHandler(session, VI_EVENT_SERVICE_REQ, &CSrqCounter::handler, &counter);
 }

@@ -23,9 +23,10 @@ for b in data["benchmarks"]:
     if b.get("run_type") != "iteration" or b.get("error_occurred"):
         continue
     scale = {"ns": 1e-3, "us": 1.0, "ms": 1e3, "s": 1e6}[b["time_unit"]]
-    r = runs.setdefault(b["run_name"], {"us": [], "allocs": [], "ips": []})
+    r = runs.setdefault(b["run_name"], {"us": [], "allocs": [], "switches": [], "ips": []})
     r["us"].append(b["real_time"] * scale)
     if "allocs" in b: r["allocs"].append(b["allocs"])
+    if "switches" in b: r["switches"].append(b["switches"])
     if "items_per_second" in b: r["ips"].append(b["items_per_second"])
 def med(name, key):
     values = runs.get(name, {}).get(key, [])
@@ -48,12 +49,12 @@ rows = [
     ("cycle with SRQ handler", "BM_SrqCycle/real_time", None),
 ]
 print("%d runs, medians; ratio = operation / three-thread ring of the same run" % int(sys.argv[2]))
-print("| operation | median µs | × ring | allocs/op | target | met |")
-print("|---|---:|---:|---:|---|---|")
+print("| operation | median µs | × ring | allocs/op | switches/op | target | met |")
+print("|---|---:|---:|---:|---:|---|---|")
 def fmt(v, f="%.2f"):
     return "–" if v is None else f % v
 for label, name, target in rows:
-    us, allocs = med(name, "us"), med(name, "allocs")
+    us, allocs, switches = med(name, "us"), med(name, "allocs"), med(name, "switches")
     ratio = us / ring if us is not None and ring else None
     goal, met = "", ""
     if target:
@@ -64,9 +65,10 @@ for label, name, target in rows:
             checks.append((goal_text, value is not None and value <= limit + 1e-9))
         goal = ", ".join(c[0] for c in checks)
         met = "yes" if all(c[1] for c in checks) else "no"
-    print("| %s | %s | %s | %s | %s | %s |" % (label, fmt(us), fmt(ratio), fmt(allocs, "%.1f"), goal, met))
+    print("| %s | %s | %s | %s | %s | %s | %s |"
+          % (label, fmt(us), fmt(ratio), fmt(allocs, "%.1f"), fmt(switches, "%.1f"), goal, met))
 threads, pairs = scaling("BM_WritesOnSensors"), scaling("BM_SemaphorePairs")
-print("| 4 threads on 4 sensors vs 1 (throughput) | | %s | | ≥ 1.8 × one thread | %s |"
+print("| 4 threads on 4 sensors vs 1 (throughput) | | %s | | | ≥ 1.8 × one thread | %s |"
       % (fmt(threads), "–" if threads is None else ("yes" if threads >= 1.8 else "no")))
-print("| 4 semaphore pairs vs 1 (baseline) | | %s | | | |" % fmt(pairs))
+print("| 4 semaphore pairs vs 1 (baseline) | | %s | | | | |" % fmt(pairs))
 PY
