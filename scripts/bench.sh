@@ -14,7 +14,7 @@ cmake --build --preset bench --target lbpmx_bench -- --no-print-directory >/dev/
 json=$(mktemp)
 trap 'rm -f "$json"' EXIT
 build/bench/bin/lbpmx_bench --benchmark_repetitions="$REPETITIONS" --benchmark_enable_random_interleaving=true \
-  --benchmark_min_time=0.2 --benchmark_out="$json" --benchmark_out_format=json "$@" >/dev/null
+  --benchmark_min_time=0.5 --benchmark_out="$json" --benchmark_out_format=json "$@" >/dev/null
 python3 - "$json" "$REPETITIONS" <<'PY'
 import json, statistics, sys
 data = json.load(open(sys.argv[1]))
