@@ -2,6 +2,8 @@
 
 #include "core/LogTime.h"
 
+#include <boost/make_shared.hpp>
+
 namespace LbCore {
 
 namespace {
@@ -16,11 +18,60 @@ const char* levelText(ELogLevel level)
     }
     return "?????";
 }
+
+bool isControl(char character)
+{
+    unsigned char byte = static_cast<unsigned char>(character);
+    return byte < 0x20 || byte == 0x7F;
+}
+
+void appendEscaped(std::string& line, char character)
+{
+    switch (character) {
+    case '\n': line += "\\n"; return;
+    case '\r': line += "\\r"; return;
+    case '\t': line += "\\t"; return;
+    }
+    static const char s_acDigits[] = "0123456789abcdef";
+    unsigned char byte = static_cast<unsigned char>(character);
+    const char escaped[4] = {'\\', 'x', s_acDigits[byte >> 4], s_acDigits[byte & 0xF]};
+    line.append(escaped, sizeof escaped);
+}
 } // namespace
+
+// ---- CLogText
+
+std::streambuf::int_type CLogText::overflow(std::streambuf::int_type character)
+{
+    typedef std::streambuf::traits_type CTraits;
+    if (!CTraits::eq_int_type(character, CTraits::eof())) {
+        char text = CTraits::to_char_type(character);
+        xsputn(&text, 1);
+    }
+    return CTraits::not_eof(character);
+}
+
+std::streamsize CLogText::xsputn(const char* text, std::streamsize count)
+{
+    const char* end = text + count;
+    while (text != end) {
+        const char* plain = text;
+        while (plain != end && !isControl(*plain)) {
+            ++plain;
+        }
+        m_sText.append(text, plain);
+        if (plain == end) {
+            break;
+        }
+        appendEscaped(m_sText, *plain);
+        text = plain + 1;
+    }
+    return count;
+}
 
 // ---- CLogManager
 
-CLogManager::CLogManager() : m_eLevel(LEVEL_DEBUG), m_cAppenders(&CILogAppender::append, false) {}
+CLogManager::CLogManager() : m_eLevel(LEVEL_DEBUG), m_nAppenders(0), m_cAppenders(&CILogAppender::append, false) {}
 
 CLogManager::~CLogManager() {}
 
@@ -49,14 +100,27 @@ bool CLogManager::attach(CILogAppender& appender)
 {
     CLogManager& manager = getInstance();
     CLock<CCriticalSection> lock(manager.m_cLock);
-    return manager.m_cAppenders.attach(appender);
+    if (!manager.m_cAppenders.attach(appender)) {
+        return false;
+    }
+    ++manager.m_nAppenders;
+    return true;
 }
 
 bool CLogManager::detach(CILogAppender& appender)
 {
     CLogManager& manager = getInstance();
     CLock<CCriticalSection> lock(manager.m_cLock);
-    return manager.m_cAppenders.detach(appender);
+    if (!manager.m_cAppenders.detach(appender)) {
+        return false;
+    }
+    --manager.m_nAppenders;
+    return true;
+}
+
+bool CLogManager::hasAppenders()
+{
+    return getInstance().m_nAppenders.load(std::memory_order_relaxed) > 0;
 }
 
 bool CLogManager::append(const CLogMessage& message)
@@ -110,12 +174,15 @@ std::string CLogger::getName() const
 
 // ---- CLogMessage
 
-CLogMessage::CLogMessage(CLogger* logger, ELogLevel level)
-    : CParent<CLogger>(logger), m_eLevel(level), m_pcText(new std::ostringstream)
+CLogMessage::CLogMessage(CLogger* logger, ELogLevel level) : CParent<CLogger>(logger), m_eLevel(level)
 {
-    if (!isEnabled()) {
+    // Whether the line is wanted is decided here, once: a message that starts unwanted stays
+    // empty and silent even if the threshold falls or an appender arrives before it ends, as
+    // a line without its head would be no use.
+    if (!isEnabled() || !CLogManager::hasAppenders()) {
         return;
     }
+    m_pcText = boost::make_shared<CLogText>();
     std::string date;
     std::string time;
     LogTime::format(date, time);
@@ -126,7 +193,7 @@ CLogMessage::~CLogMessage()
 {
     // Only the last copy emits, so a message handed around by value makes one line. A
     // destructor must not throw: a message without logger or manager is simply dropped.
-    if (m_pcText.use_count() != 1) {
+    if (!m_pcText || m_pcText.use_count() != 1) {
         return;
     }
     try {
@@ -145,7 +212,7 @@ bool CLogMessage::isEnabled() const
 
 std::string CLogMessage::getText() const
 {
-    return m_pcText->str();
+    return m_pcText ? m_pcText->str() : std::string();
 }
 
 } // namespace LbCore

@@ -4,8 +4,11 @@
 // fully qualified operation name, " - " and the text into it; the line is handed to every
 // attached appender when the last copy of the message is destroyed. Line format:
 //   <short date> <24-hour time> [<LEVEL>] <logger name> - <what the caller streamed>
-// Messages below the manager's threshold cost one comparison per insertion and are dropped.
-// CLogManager is the composite appender fanning lines out, one at a time, to the appenders.
+// A message below the manager's threshold, or made while no appender is attached, builds
+// nothing and allocates nothing: it costs one comparison per insertion and is dropped.
+// Control characters in what is streamed are written escaped ("\n", "\x00"), so one message
+// is always one printable line. CLogManager is the composite appender fanning lines out, one
+// at a time, to the appenders.
 #include "core/Command.h"
 #include "core/Lock.h"
 #include "core/Parent.h"
@@ -16,7 +19,9 @@
 #include <boost/shared_ptr.hpp>
 #include <exception>
 #include <fstream>
+#include <ostream>
 #include <sstream>
+#include <streambuf>
 #include <string>
 #include <type_traits>
 
@@ -49,6 +54,8 @@ public:
     static int getLevel();
     static bool attach(CILogAppender& appender);
     static bool detach(CILogAppender& appender);
+    // True while at least one appender is attached: without one, no line needs building.
+    static bool hasAppenders();
 
     // Fans the line out to the attached appenders; true when at least one wrote it.
     bool append(const CLogMessage& message) override;
@@ -58,6 +65,7 @@ private:
     ~CLogManager() override;
 
     std::atomic<int> m_eLevel;
+    std::atomic<int> m_nAppenders;
     CSubject<CILogAppender, bool(const CLogMessage&)> m_cAppenders;
     CCriticalSection m_cLock;
 };
@@ -90,6 +98,21 @@ private:
     std::string m_sName;
 };
 
+// The text of one line: a stream that appends to a string and writes every control character
+// (below 0x20, and 0x7F) escaped: "\n", "\r", "\t", otherwise "\x" and two hex digits. Other
+// bytes, the backslash included, are written as they are.
+class CLogText : private std::streambuf, public std::ostream {
+public:
+    CLogText() : std::ostream(static_cast<std::streambuf*>(this)) {}
+    const std::string& str() const { return m_sText; }
+
+private:
+    std::streambuf::int_type overflow(std::streambuf::int_type character) override;
+    std::streamsize xsputn(const char* text, std::streamsize count) override;
+
+    std::string m_sText;
+};
+
 class CLogMessage : public CParent<CLogger> {
 public:
     typedef CISerializer<CLogMessage&, void> CSerializer;
@@ -109,7 +132,7 @@ public:
     template <class T>
     CLogMessage& operator<<(const T& value)
     {
-        if (!isEnabled()) {
+        if (!isEnabled() || !m_pcText) {
             return *this;
         }
         if constexpr (std::is_base_of<std::exception, T>::value) {
@@ -125,7 +148,8 @@ public:
 
 private:
     ELogLevel m_eLevel;
-    boost::shared_ptr<std::ostringstream> m_pcText;
+    // Shared by the copies of a message; null when the message was not built.
+    boost::shared_ptr<CLogText> m_pcText;
 };
 
 } // namespace LbCore

@@ -8,7 +8,8 @@
 // the new thread; stop() is cooperative and does not wait; join()/stopAndJoin() wait for the
 // end. When the worker ends, the attached observers are called on it, in attachment order.
 // Results: 0 done, 1 already running, 2 stopping, 3 not running, 4 could not be created,
-// 6 the wait for the end timed out.
+// 6 the wait for the end timed out. On POSIX a worker reserves a 256 KiB stack (Windows: the
+// default reservation).
 #include "core/Command.h"
 #include "core/Lock.h"
 #include "core/MemoryPool.h"

@@ -3,8 +3,11 @@
 #include "core/Log.h"
 #include "core/ThreadPlatform.h"
 
+#include <algorithm>
+#include <cerrno>
 #include <new>
 #include <pthread.h>
+#include <unistd.h>
 
 namespace LbCore {
 
@@ -13,6 +16,11 @@ static CLogger s_cLogger = CLogManager::getLogger("CThread");
 namespace ThreadPlatform {
 
 namespace {
+// A worker's stack: the system's threads deliver events and log; none runs application code
+// (VISA handlers run on the runtime's own thread). 256 KiB leaves ample room, also for the
+// larger frames of sanitizer builds, where the platform default reserves 8 MiB per thread.
+const std::size_t STACK_SIZE = 256 * 1024;
+
 struct CStart {
     unsigned (*entry)(void*);
     void* argument;
@@ -36,7 +44,21 @@ bool create(unsigned (*entry)(void*), void* argument, void*& handle, std::uint32
         return false;
     }
     pthread_t thread;
-    if (pthread_create(&thread, 0, &trampoline, start) != 0) {
+    pthread_attr_t attributes;
+    bool initialised = pthread_attr_init(&attributes) == 0;
+    long minimum = sysconf(_SC_THREAD_STACK_MIN);
+    bool small = initialised &&
+                 pthread_attr_setstacksize(&attributes, std::max<std::size_t>(STACK_SIZE, minimum > 0 ? minimum : 0)) == 0;
+    // A platform that refuses the small stack (for instance for a large static TLS block)
+    // still gets its thread, with the default stack.
+    int created = small ? pthread_create(&thread, &attributes, &trampoline, start) : EINVAL;
+    if (created == EINVAL) {
+        created = pthread_create(&thread, 0, &trampoline, start);
+    }
+    if (initialised) {
+        pthread_attr_destroy(&attributes);
+    }
+    if (created != 0) {
         delete start;
         return false;
     }

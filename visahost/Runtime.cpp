@@ -997,6 +997,7 @@ ViStatus CRuntime::statusDesc(ViObject, ViStatus nStatus, ViChar szDesc[]) {
 }
 
 bool CRuntime::accessAllowed(const CObject &c) const {
+  if (m_mapRsrcLocks.empty()) return true;  // the common case, without building a key
   auto it = m_mapRsrcLocks.find(upper(c.m_strRsrc));
   if (it == m_mapRsrcLocks.end()) return true;
   const SRsrcLock &s = it->second;

@@ -3,14 +3,52 @@
 
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <cstdio>
+#include <cstdlib>
 #include <ctime>
 #include <fstream>
+#include <new>
 #include <regex>
 #include <stdexcept>
 #include <thread>
 
 using namespace LbCore;
+
+// Every allocation of this test program is counted, so a case can check that an operation
+// allocates nothing. All forms are replaced, so that sanitizers see matching pairs.
+static std::atomic<unsigned long> s_nAllocations(0);
+
+static void* countedAllocation(std::size_t size) noexcept
+{
+    ++s_nAllocations;
+    return std::malloc(size == 0 ? 1 : size);
+}
+
+void* operator new(std::size_t size)
+{
+    if (void* memory = countedAllocation(size)) {
+        return memory;
+    }
+    throw std::bad_alloc();
+}
+void* operator new[](std::size_t size) { return operator new(size); }
+void* operator new(std::size_t size, const std::nothrow_t&) noexcept { return countedAllocation(size); }
+void* operator new[](std::size_t size, const std::nothrow_t&) noexcept { return countedAllocation(size); }
+// GCC takes free() after an inlined operator new for a mismatch; here both are malloc's.
+#if defined(__GNUC__) && !defined(__clang__)
+#pragma GCC diagnostic push
+#pragma GCC diagnostic ignored "-Wmismatched-new-delete"
+#endif
+void operator delete(void* memory) noexcept { std::free(memory); }
+void operator delete(void* memory, std::size_t) noexcept { std::free(memory); }
+void operator delete[](void* memory) noexcept { std::free(memory); }
+void operator delete[](void* memory, std::size_t) noexcept { std::free(memory); }
+void operator delete(void* memory, const std::nothrow_t&) noexcept { std::free(memory); }
+void operator delete[](void* memory, const std::nothrow_t&) noexcept { std::free(memory); }
+#if defined(__GNUC__) && !defined(__clang__)
+#pragma GCC diagnostic pop
+#endif
 
 namespace {
 
@@ -202,6 +240,95 @@ TEST_F(CLogTest, TwoThreadsWriteWholeLines)
         std::smatch match;
         ASSERT_TRUE(std::regex_search(line, match, whole)) << line;
         EXPECT_EQ(match[2].str(), match[3].str()) << line;
+    }
+    std::remove(path.c_str());
+}
+
+TEST_F(CLogTest, ControlCharactersAreWrittenEscapedOnOneLine)
+{
+    const std::string forged("FUNC POWER\n01/01/99 00:00:00 [ERROR] forged");
+    m_cLogger.info() << "cmd " << forged << " | " << std::string("a\0b", 3) << '\r' << "\t\x1b\x7f\\x" << -5
+                     << " | " << std::runtime_error("two\nlines");
+    std::vector<std::string> lines = m_cCapture.lines();
+    ASSERT_EQ(1u, lines.size());
+    const std::string tail = "CTestLogger - cmd FUNC POWER\\n01/01/99 00:00:00 [ERROR] forged | a\\x00b\\r\\t\\x1b\\x7f\\x-5"
+                             " | two\\nlines";
+    ASSERT_GE(lines[0].size(), tail.size());
+    EXPECT_EQ(tail, lines[0].substr(lines[0].size() - tail.size()));
+}
+
+TEST_F(CLogTest, UnwrittenMessagesBuildAndAllocateNothing)
+{
+    int value = 7;
+    auto logAll = [&] {
+        m_cLogger.debug() << "LbCore::CTest::op" << " - " << "value " << value << ' ' << 3u << ' ' << &value;
+        m_cLogger.info() << "LbCore::CTest::op" << " - " << "info";
+    };
+    CLogManager::setLevel(LEVEL_WARN); // below the threshold, an appender attached
+    unsigned long before = s_nAllocations;
+    logAll();
+    EXPECT_EQ(before, s_nAllocations.load());
+
+    CLogManager::setLevel(LEVEL_DEBUG); // enabled, but nobody to write to
+    ASSERT_TRUE(CLogManager::detach(m_cCapture));
+    before = s_nAllocations;
+    logAll();
+    {
+        CLogMessage message = m_cLogger.error();
+        message << "dropped";
+        EXPECT_EQ("", message.getText());
+        ASSERT_TRUE(CLogManager::attach(m_cCapture)); // too late for this message
+    }
+    EXPECT_EQ(before, s_nAllocations.load());
+    EXPECT_TRUE(m_cCapture.lines().empty());
+}
+
+// What reaches a log file at each threshold is exactly what any other appender receives, and
+// the same lines come whether or not a file is attached.
+TEST_F(CLogTest, OutputIsTheSameAtEveryLevelWithAndWithoutAFile)
+{
+    CSelfWriter writer;
+    auto logAll = [&](CLogger& logger) {
+        logger.debug() << "LbCore::CTest::op" << " - " << "d " << 1 << ' ' << &writer;
+        logger.info() << "LbCore::CTest::op" << " - " << "i " << 2u;
+        logger.warn() << "LbCore::CTest::op" << " - " << "w " << 18446744073709551615ull;
+        logger.error() << "LbCore::CTest::op" << " - " << std::runtime_error("e");
+        logger.fatal() << "LbCore::CTest::op" << " - " << "f";
+    };
+    const std::string tails[] = {"[DEBUG] CTestLogger - LbCore::CTest::op - d 1 session 0x0003::100000",
+                                 "[INFO ] CTestLogger - LbCore::CTest::op - i 2",
+                                 "[WARN ] CTestLogger - LbCore::CTest::op - w 18446744073709551615",
+                                 "[ERROR] CTestLogger - LbCore::CTest::op - e", "[FATAL] CTestLogger - LbCore::CTest::op - f"};
+    const std::string path = tempPath("levels.log");
+    for (int level = LEVEL_DEBUG; level <= LEVEL_FATAL; ++level) {
+        CLogManager::setLevel(level);
+        std::vector<std::string> withoutFile;
+        std::vector<std::string> withFile;
+        {
+            LbTests::CCaptureAppender capture;
+            logAll(m_cLogger);
+            withoutFile = capture.lines();
+        }
+        std::remove(path.c_str());
+        {
+            LbTests::CCaptureAppender capture;
+            CLogFileAppender file(path);
+            ASSERT_TRUE(file.isOpen());
+            logAll(m_cLogger);
+            withFile = capture.lines();
+        }
+        ASSERT_EQ(static_cast<std::size_t>(5 - level), withoutFile.size()) << "level " << level;
+        ASSERT_EQ(withoutFile.size(), withFile.size());
+        std::string expectedFile;
+        for (std::size_t i = 0; i < withFile.size(); ++i) {
+            std::regex line(std::string(kHead) + "\\" + tails[level + i] + "$");
+            EXPECT_TRUE(std::regex_search(withoutFile[i], line)) << withoutFile[i];
+            EXPECT_TRUE(std::regex_search(withFile[i], line)) << withFile[i];
+            expectedFile += withFile[i] + "\n";
+        }
+        std::ifstream file(path.c_str()); // text mode: a Windows line end reads as "\n"
+        std::string written((std::istreambuf_iterator<char>(file)), std::istreambuf_iterator<char>());
+        EXPECT_EQ(expectedFile, written) << "level " << level;
     }
     std::remove(path.c_str());
 }

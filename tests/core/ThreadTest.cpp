@@ -12,6 +12,10 @@
 #include <thread>
 #include <vector>
 
+#if !defined(_WIN32)
+#include <pthread.h>
+#endif
+
 using namespace LbCore;
 
 namespace {
@@ -193,6 +197,40 @@ TEST_F(CThreadTest, ThreadWithItsOwnHooksEndsAtOnce)
     EXPECT_EQ(0, thread.start());
     EXPECT_EQ(0, thread.join(kInfinite));
     EXPECT_EQ(std::vector<int>{1}, calls());
+}
+
+// A worker has room for real work on its stack, without reserving the 8 MiB a POSIX thread
+// gets by default.
+TEST_F(CThreadTest, WorkerStackIsSmallButRoomy)
+{
+    class CStackProbe : public CIRunnable {
+    public:
+        bool init() override
+        {
+            volatile char buffer[96 * 1024];
+            buffer[0] = 1;
+            buffer[sizeof buffer - 1] = 1;
+#if !defined(_WIN32)
+            pthread_attr_t attributes;
+            if (pthread_getattr_np(pthread_self(), &attributes) == 0) {
+                pthread_attr_getstacksize(&attributes, &m_nStackSize);
+                pthread_attr_destroy(&attributes);
+            }
+#endif
+            return buffer[0] + buffer[sizeof buffer - 1] != 2;
+        }
+        bool run() override { return false; }
+        void cleanup() override {}
+        std::size_t m_nStackSize = 0;
+    };
+    CStackProbe probe;
+    CThread thread(probe);
+    ASSERT_EQ(0, thread.start());
+    EXPECT_EQ(0, thread.join(kInfinite));
+#if !defined(_WIN32)
+    EXPECT_LT(probe.m_nStackSize, 1024u * 1024u);
+    EXPECT_GT(probe.m_nStackSize, 128u * 1024u);
+#endif
 }
 
 TEST_F(CThreadTest, SpinningRunIsStoppedBetweenCalls)
