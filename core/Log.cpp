@@ -167,6 +167,19 @@ CLogMessage CLogger::warn() { return CLogMessage(this, LEVEL_WARN); }
 CLogMessage CLogger::error() { return CLogMessage(this, LEVEL_ERROR); }
 CLogMessage CLogger::fatal() { return CLogMessage(this, LEVEL_FATAL); }
 
+CLogMessage CLogger::debug(const char* operation) { return begin(LEVEL_DEBUG, operation); }
+CLogMessage CLogger::info(const char* operation) { return begin(LEVEL_INFO, operation); }
+CLogMessage CLogger::warn(const char* operation) { return begin(LEVEL_WARN, operation); }
+CLogMessage CLogger::error(const char* operation) { return begin(LEVEL_ERROR, operation); }
+CLogMessage CLogger::fatal(const char* operation) { return begin(LEVEL_FATAL, operation); }
+
+CLogMessage CLogger::begin(ELogLevel level, const char* operation)
+{
+    CLogMessage message(this, level);
+    message << operation << " - ";
+    return message;
+}
+
 std::string CLogger::getName() const
 {
     return m_sName;

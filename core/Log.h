@@ -1,8 +1,9 @@
 #ifndef LBCORE_LOG_H
 #define LBCORE_LOG_H
-// Logging. A class takes a CLogMessage of a level from its file-level CLogger, streams the
-// fully qualified operation name, " - " and the text into it; the line is handed to every
-// attached appender when the last copy of the message is destroyed. Line format:
+// Logging. A class takes a CLogMessage of a level and an operation from its file-level CLogger,
+// which writes the fully qualified operation name and " - ", and streams the text into it; the
+// line is handed to every attached appender when the last copy of the message is destroyed.
+// Line format:
 //   <short date> <24-hour time> [<LEVEL>] <logger name> - <what the caller streamed>
 // A message below the manager's threshold, or made while no appender is attached, builds
 // nothing and allocates nothing: it costs one comparison per insertion and is dropped.
@@ -92,9 +93,17 @@ public:
     CLogMessage warn();
     CLogMessage error();
     CLogMessage fatal();
+    // The same, with the line's operation prefix already written: "<operation> - ".
+    CLogMessage debug(const char* operation);
+    CLogMessage info(const char* operation);
+    CLogMessage warn(const char* operation);
+    CLogMessage error(const char* operation);
+    CLogMessage fatal(const char* operation);
     std::string getName() const;
 
 private:
+    CLogMessage begin(ELogLevel level, const char* operation);
+
     std::string m_sName;
 };
 

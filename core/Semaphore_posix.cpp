@@ -37,7 +37,7 @@ CSemaphore::CSemaphore(unsigned initialCount) : m_aSemaphore(0)
 CSemaphore::~CSemaphore()
 {
     if (sem_destroy(semOf(m_aSemaphore)) != 0) {
-        s_cLogger.error() << "LbCore::CSemaphore::~CSemaphore" << " - " << "::CloseHandle failed";
+        s_cLogger.error("LbCore::CSemaphore::~CSemaphore") << "::CloseHandle failed";
     }
     delete semOf(m_aSemaphore);
 }

@@ -20,7 +20,7 @@ CSemaphore::CSemaphore(unsigned initialCount) : m_aSemaphore(0)
 CSemaphore::~CSemaphore()
 {
     if (!CloseHandle(m_aSemaphore)) {
-        s_cLogger.error() << "LbCore::CSemaphore::~CSemaphore" << " - " << "::CloseHandle failed";
+        s_cLogger.error("LbCore::CSemaphore::~CSemaphore") << "::CloseHandle failed";
     }
 }
 

@@ -24,11 +24,11 @@ CThread::CThread(CIRunnable& runnable)
 CThread::~CThread()
 {
     if (getState() != STATE_IDLE) {
-        s_cLogger.warn() << "LbCore::CThread::~CThread" << " - " << "Thread has been not stopped safely";
+        s_cLogger.warn("LbCore::CThread::~CThread") << "Thread has been not stopped safely";
         terminate();
     }
     if (m_hThread != 0 && !ThreadPlatform::close(m_hThread)) {
-        s_cLogger.error() << "LbCore::CThread::~CThread" << " - " << "Could not close the handle for thread " << m_hThread;
+        s_cLogger.error("LbCore::CThread::~CThread") << "Could not close the handle for thread " << m_hThread;
     }
 }
 
@@ -56,7 +56,7 @@ int CThread::start()
     void* handle = 0;
     std::uint32_t id = 0;
     if (!ThreadPlatform::create(&CThread::threadMain, this, handle, id)) {
-        s_cLogger.error() << "LbCore::CThread::start" << " - " << "Could not start thread!";
+        s_cLogger.error("LbCore::CThread::start") << "Could not start thread!";
         setState(STATE_IDLE);
         m_hThread = 0;
         return RESULT_NOT_CREATED;
@@ -140,9 +140,9 @@ bool guarded(const char* hook, F call)
     try {
         return call();
     } catch (const std::exception& e) {
-        s_cLogger.error() << "LbCore::CThread::work" << " - " << "Exception in " << hook << ": " << e.what();
+        s_cLogger.error("LbCore::CThread::work") << "Exception in " << hook << ": " << e.what();
     } catch (...) {
-        s_cLogger.error() << "LbCore::CThread::work" << " - " << "Unknown exception in " << hook;
+        s_cLogger.error("LbCore::CThread::work") << "Unknown exception in " << hook;
     }
     return false;
 }

@@ -88,7 +88,7 @@ bool CThread::terminate()
     if (getState() == STATE_IDLE) {
         return false;
     }
-    s_cLogger.error() << "LbCore::CThread::terminate" << " - " << "No forced termination on this platform; stopping the thread and waiting for its end";
+    s_cLogger.error("LbCore::CThread::terminate") << "No forced termination on this platform; stopping the thread and waiting for its end";
     stop();
     m_cFinished.wait();
     return true;

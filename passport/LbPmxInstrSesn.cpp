@@ -40,7 +40,7 @@ void copyText(ViChar* destination, const std::string& text)
 
 void logError(const char* operation, const char* text)
 {
-    s_cLogger.error() << operation << " - " << text;
+    s_cLogger.error(operation) << text;
 }
 
 // The common exception-to-status mapping of the session operations. Each operation names the
@@ -150,7 +150,7 @@ ViStatus CLbPmxInstrSesn::viOpen(ViConstRsrc name, ViAccessMode, ViUInt32)
     try {
         CPmxSessionDispatcher& dispatcher = CPmxSessionDispatcher::getInstance();
         if (dispatcher.getActiveSessionCount() > MAX_ACTIVE_SESSIONS) {
-            s_cLogger.warn() << OPERATION << " - " << "There are already " << MAX_ACTIVE_SESSIONS << " active devices...";
+            s_cLogger.warn(OPERATION) << "There are already " << MAX_ACTIVE_SESSIONS << " active devices...";
             return VI_ERROR_RSRC_NFOUND;
         }
         m_pcSession = dispatcher.getSession(CPmxResourceInfo(name == 0 ? std::string() : std::string(name)));
@@ -164,10 +164,10 @@ ViStatus CLbPmxInstrSesn::viOpen(ViConstRsrc name, ViAccessMode, ViUInt32)
         }
         return CNiViSv::installTable(m_nSession, getVectorTable(), 0, m_nSession, 0);
     } catch (const std::exception& e) {
-        s_cLogger.error() << OPERATION << " - " << e.what();
+        s_cLogger.error(OPERATION) << e.what();
         return VI_ERROR_RSRC_NFOUND;
     } catch (...) {
-        s_cLogger.error() << OPERATION << " - " << "Unknown error";
+        s_cLogger.error(OPERATION) << "Unknown error";
         return VI_ERROR_SYSTEM_ERROR;
     }
 }
@@ -304,10 +304,10 @@ ViStatus CLbPmxInstrSesn::viFindRsrc(ViSession rm, ViConstString expression, ViP
             }
         } catch (const std::exception& e) {
             // The lock is released on the way out and the application gets an error status.
-            s_cLogger.error() << "LbPmxPassport::CLbPmxInstrSesn::viFindRsrc" << " - " << e.what();
+            s_cLogger.error("LbPmxPassport::CLbPmxInstrSesn::viFindRsrc") << e.what();
             return VI_ERROR_SYSTEM_ERROR;
         } catch (...) {
-            s_cLogger.error() << "LbPmxPassport::CLbPmxInstrSesn::viFindRsrc" << " - " << "Unknown exception...";
+            s_cLogger.error("LbPmxPassport::CLbPmxInstrSesn::viFindRsrc") << "Unknown exception...";
             return VI_ERROR_SYSTEM_ERROR;
         }
     }
@@ -361,9 +361,9 @@ ViStatus CLbPmxInstrSesn::viGetAttribute(ViAttr attribute, void* value)
     try {
         return getAttribute(attribute, value);
     } catch (const std::exception& e) {
-        s_cLogger.error() << "LbPmxPassport::CLbPmxInstrSesn::viGetAttribute" << " - " << e.what();
+        s_cLogger.error("LbPmxPassport::CLbPmxInstrSesn::viGetAttribute") << e.what();
     } catch (...) {
-        s_cLogger.error() << "LbPmxPassport::CLbPmxInstrSesn::viGetAttribute" << " - " << "Unknown exception...";
+        s_cLogger.error("LbPmxPassport::CLbPmxInstrSesn::viGetAttribute") << "Unknown exception...";
     }
     return VI_ERROR_SYSTEM_ERROR;
 }

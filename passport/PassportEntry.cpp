@@ -88,7 +88,7 @@ ViStatus _VI_FUNC entryOpen(ViSession, ViConstRsrc name, ViAccessMode mode, ViUI
     // counted out of the open sensor sessions): the open fails before anything is opened.
     ViAddr* record = CNiViSv::sessionRecord(*session);
     if (record == 0) {
-        s_cLogger.error() << "LbPmxPassport::CLbPmxInstrSesn::viOpen" << " - " << "No session record for session "
+        s_cLogger.error("LbPmxPassport::CLbPmxInstrSesn::viOpen") << "No session record for session "
                           << *session;
         return VI_ERROR_SYSTEM_ERROR;
     }

@@ -55,8 +55,7 @@ void CPmxErrorQueue::notifyErrorOccuredEvent(const CPmxEvent& event)
     char text[1024] = {0};
     dispatcher->getCommands()->getErrorText(code, text, sizeof(text));
     text[sizeof(text) - 1] = 0; // a library that fills the whole buffer still yields a terminated text
-    s_cLogger.error() << "LbPmxVisa::CPmxErrorQueue::notifyErrorOccuredEvent" << " - "
-                      << "An Pmx-Error has been occurred on session " << session << " [Error: " << text << "]";
+    s_cLogger.error("LbPmxVisa::CPmxErrorQueue::notifyErrorOccuredEvent") << "An Pmx-Error has been occurred on session " << session << " [Error: " << text << "]";
     LbCore::CLock<LbCore::CCriticalSection> lock(m_cLock);
     m_cEntries.push_back(std::make_pair(code, std::string(text)));
 }

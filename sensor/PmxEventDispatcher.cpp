@@ -42,15 +42,13 @@ void CPmxEventDispatcher::CPmxEventMessage::execute(const LbCore::CThread&)
     if (dispatcher->m_cCleanedUp.wait(CLEANUP_WAIT_MS)) {
         dispatcher->m_cCleanedUp.release(1);
     }
-    s_cLogger.debug() << "LbPmxVisa::CPmxEventDispatcher::CPmxEventMessage::execute" << " - "
-                      << "Shutdown CPmxEventDispatcher ";
+    s_cLogger.debug("LbPmxVisa::CPmxEventDispatcher::CPmxEventMessage::execute") << "Shutdown CPmxEventDispatcher ";
     getParent()->m_cListeners.disable();
 }
 
 void CPmxEventDispatcher::CPmxEventMessage::deliver()
 {
-    s_cLogger.debug() << "LbPmxVisa::CPmxEventDispatcher::CPmxEventMessage::deliver" << " - "
-                      << "Delivering message for CPmxEventDispatcher ";
+    s_cLogger.debug("LbPmxVisa::CPmxEventDispatcher::CPmxEventMessage::deliver") << "Delivering message for CPmxEventDispatcher ";
     getParent()->m_cListeners.notify(m_cEvent, m_pfOperation);
 }
 
@@ -62,9 +60,8 @@ CPmxEventDispatcher::CPmxEventDispatcher(CPmxSession* session)
 {
     if (m_cWorker.start() != LbCore::CThread::RESULT_DONE) {
         {
-            LbCore::CLogMessage message = s_cLogger.error();
-            message << "LbPmxVisa::CPmxEventDispatcher::CPmxEventDispatcher" << " - "
-                    << "Could not start thread! Undefined behavior! Session ";
+            LbCore::CLogMessage message = s_cLogger.error("LbPmxVisa::CPmxEventDispatcher::CPmxEventDispatcher");
+            message << "Could not start thread! Undefined behavior! Session ";
             if (session != 0) {
                 message << session;
             }
@@ -83,10 +80,9 @@ void CPmxEventDispatcher::shutdown()
     if (m_bShutDown.exchange(true)) {
         return;
     }
-    s_cLogger.debug() << "LbPmxVisa::CPmxEventDispatcher::~CPmxEventDispatcher" << " - " << "stopAndJoin(...)";
+    s_cLogger.debug("LbPmxVisa::CPmxEventDispatcher::~CPmxEventDispatcher") << "stopAndJoin(...)";
     m_cWorker.stopAndJoin(LbCore::CSemaphore::INFINITE_WAIT);
-    s_cLogger.debug() << "LbPmxVisa::CPmxEventDispatcher::~CPmxEventDispatcher" << " - "
-                      << "Thread has been stopped. Destruction continues...";
+    s_cLogger.debug("LbPmxVisa::CPmxEventDispatcher::~CPmxEventDispatcher") << "Thread has been stopped. Destruction continues...";
 }
 
 bool CPmxEventDispatcher::addListener(CIPmxEventListener* listener)
@@ -132,8 +128,7 @@ void CPmxEventDispatcher::queue(const CPmxEvent& event, PmxNotification operatio
     try {
         message = new CPmxEventMessage(this, event, operation);
     } catch (const std::exception& e) {
-        s_cLogger.error() << "LbPmxVisa::CPmxEventDispatcher::queue" << " - "
-                          << "Could not create a message, event dropped: " << e.what();
+        s_cLogger.error("LbPmxVisa::CPmxEventDispatcher::queue") << "Could not create a message, event dropped: " << e.what();
         return;
     }
     m_cQueue.push(message, 0);
@@ -155,9 +150,9 @@ bool CPmxEventDispatcher::run()
     try {
         message->deliver();
     } catch (const std::exception& e) {
-        s_cLogger.error() << "LbPmxVisa::CPmxEventDispatcher::run" << " - " << "Exception during delivery: " << e.what();
+        s_cLogger.error("LbPmxVisa::CPmxEventDispatcher::run") << "Exception during delivery: " << e.what();
     } catch (...) {
-        s_cLogger.error() << "LbPmxVisa::CPmxEventDispatcher::run" << " - " << "Unknown exception during delivery";
+        s_cLogger.error("LbPmxVisa::CPmxEventDispatcher::run") << "Unknown exception during delivery";
     }
     delete message;
     return true;
@@ -167,7 +162,7 @@ void CPmxEventDispatcher::cleanup()
 {
     m_cQueue.interrupt();
     m_cListeners.disable();
-    s_cLogger.debug() << "LbPmxVisa::CPmxEventDispatcher::cleanup" << " - " << "Queue interrupt(...) ";
+    s_cLogger.debug("LbPmxVisa::CPmxEventDispatcher::cleanup") << "Queue interrupt(...) ";
     m_cCleanedUp.release(1);
 }
 

@@ -46,25 +46,25 @@ CPmxSession::~CPmxSession()
 {
     if (m_lHandle != 0) {
         try {
-            s_cLogger.info() << "LbPmxVisa::CPmxSession::~CPmxSession" << " - " << "Closing session " << this;
+            s_cLogger.info("LbPmxVisa::CPmxSession::~CPmxSession") << "Closing session " << this;
             getParent()->callChecked(&CIPmxCommands::closeSensor, *this);
-            s_cLogger.info() << "LbPmxVisa::CPmxSession::~CPmxSession" << " - " << "Session closed successfully";
+            s_cLogger.info("LbPmxVisa::CPmxSession::~CPmxSession") << "Session closed successfully";
         } catch (const std::exception& e) {
-            s_cLogger.error() << "LbPmxVisa::CPmxSession::~CPmxSession" << " - " << "Closing session " << this
+            s_cLogger.error("LbPmxVisa::CPmxSession::~CPmxSession") << "Closing session " << this
                               << " failed: " << e.what();
         }
         m_cMessageQueue.interrupt();
         try {
             getParent()->detach(*this);
         } catch (const std::exception& e) {
-            s_cLogger.error() << "LbPmxVisa::CPmxSession::~CPmxSession" << " - " << "Leaving the dispatcher failed for session "
+            s_cLogger.error("LbPmxVisa::CPmxSession::~CPmxSession") << "Leaving the dispatcher failed for session "
                               << this << ": " << e.what();
         }
     } else {
         try {
             getParent()->closeDriverIfIdle();
         } catch (const std::exception& e) {
-            s_cLogger.error() << "LbPmxVisa::CPmxSession::~CPmxSession" << " - " << "Closing the driver failed: " << e.what();
+            s_cLogger.error("LbPmxVisa::CPmxSession::~CPmxSession") << "Closing the driver failed: " << e.what();
         }
     }
     // The event thread uses the error queue, the message queue and the data semaphore, which
@@ -74,9 +74,9 @@ CPmxSession::~CPmxSession()
 
 void CPmxSession::open()
 {
-    s_cLogger.info() << "LbPmxVisa::CPmxSession::open" << " - " << "Open session";
+    s_cLogger.info("LbPmxVisa::CPmxSession::open") << "Open session";
     getParent()->callChecked(&CIPmxCommands::openSensor, m_cResourceInfo, &m_lHandle);
-    s_cLogger.info() << "LbPmxVisa::CPmxSession::open" << " - " << "Session opened successfully: " << this;
+    s_cLogger.info("LbPmxVisa::CPmxSession::open") << "Session opened successfully: " << this;
     getParent()->registerSession(*this);
     m_cEventDispatcher.addListener(this);
 }
@@ -86,19 +86,18 @@ void CPmxSession::execute(const CSessionCommand& command)
     if (LbCore::interlockedCompareExchange(&m_lBusy, 1, 0) != 0) {
         throw CPmxSessionIsBusyException();
     }
-    s_cLogger.debug() << "LbPmxVisa::CPmxSession::execute" << " - " << "Executing command for session " << this;
+    s_cLogger.debug("LbPmxVisa::CPmxSession::execute") << "Executing command for session " << this;
     try {
         // Commands are handed over as constant references but are ordinary objects.
         const_cast<CSessionCommand&>(command).execute(*this);
     } catch (...) {
         if (LbCore::interlockedCompareExchange(&m_lBusy, 0, 1) != 1) {
-            s_cLogger.error() << "LbPmxVisa::CPmxSession::execute" << " - "
-                              << "::InterlockedCompareExchange failed for session " << this;
+            s_cLogger.error("LbPmxVisa::CPmxSession::execute") << "::InterlockedCompareExchange failed for session " << this;
         }
         throw;
     }
     if (LbCore::interlockedCompareExchange(&m_lBusy, 0, 1) != 1) {
-        s_cLogger.error() << "LbPmxVisa::CPmxSession::execute" << " - " << "::InterlockedCompareExchange failed for session "
+        s_cLogger.error("LbPmxVisa::CPmxSession::execute") << "::InterlockedCompareExchange failed for session "
                           << this;
     }
 }
@@ -160,8 +159,7 @@ void CPmxSession::write(const std::string& command)
         {
             std::string head = m_sText.substr(0, m_sText.find_first_of("\r\n"));
             if (scpiCompare("FETCh?", head.c_str()) == 0) {
-                s_cLogger.debug() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
-                                  << "fetch command executed " << &session;
+                s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "fetch command executed " << &session;
                 return;
             }
             session.dropReply();
@@ -172,8 +170,7 @@ void CPmxSession::write(const std::string& command)
             // answer when the sensor answers at once, and the writer would wait in vain.
             int result = CMessageQueue::RESULT_ITEM;
             while (session.m_nMessageCount + 1 < session.m_nCommandCount && result == CMessageQueue::RESULT_ITEM) {
-                s_cLogger.warn() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
-                                 << "Asynchronous Message detected! Will be deleted to ensure stable further working!";
+                s_cLogger.warn("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "Asynchronous Message detected! Will be deleted to ensure stable further working!";
                 if (session.m_cMessageQueue.size() >= 1) {
                     CPmxSessionMessage* stale = 0;
                     result = session.m_cMessageQueue.pop(stale, 0);
@@ -187,8 +184,7 @@ void CPmxSession::write(const std::string& command)
             session.changeState(CIPmxSessionState::noData());
             CPmxSessionDispatcher* dispatcher = session.getParent();
             dispatcher->callChecked(&CIPmxCommands::emptyAllBuffers, session);
-            s_cLogger.debug() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
-                              << "Execute PmxSendCommand(...) [" << m_sText << "] for session " << &session;
+            s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "Execute PmxSendCommand(...) [" << m_sText << "] for session " << &session;
             dispatcher->callChecked(&CIPmxCommands::sendCommand, session, m_sText);
 
             // Set before the removal message is queued: a writer that misses the message sees the flag.
@@ -197,17 +193,15 @@ void CPmxSession::write(const std::string& command)
             }
             CPmxSessionMessage* message = 0;
             if (session.m_cMessageQueue.pop(message, toWait(session.m_nTimeout)) != CMessageQueue::RESULT_ITEM) {
-                s_cLogger.info() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
-                                 << "No message arrived for session " << &session;
+                s_cLogger.info("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "No message arrived for session " << &session;
                 ++session.m_nMessageCount;
                 return;
             }
             std::unique_ptr<CPmxSessionMessage> owner(message);
-            s_cLogger.debug() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - " << "Message arrived "
+            s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "Message arrived "
                               << session.m_nMessageCount << " / " << session.m_nCommandCount << " for session "
                               << &session;
-            s_cLogger.debug() << "LbPmxVisa::CPmxSession::write::CWriteCommand::execute" << " - "
-                              << "Delivering message for session " << &session;
+            s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "Delivering message for session " << &session;
             try {
                 owner->deliver();
             } catch (const CPmxSessionDispatcher::CPmxCommandException&) {
@@ -233,7 +227,7 @@ void CPmxSession::write(const std::string& command)
         if (!token.empty() && token[0] == ':') {
             token.erase(0, 1);
         }
-        s_cLogger.info() << "LbPmxVisa::CPmxSession::write" << " - " << "Writing to Session " << this << " with command "
+        s_cLogger.info("LbPmxVisa::CPmxSession::write") << "Writing to Session " << this << " with command "
                          << token;
         switch (CPmxScpiCommandParser::getInstance().parse(token)) {
         case CPmxScpiCommandParser::COMMAND_SYSTEM_ERROR_QUERY: {
@@ -285,8 +279,7 @@ void CPmxSession::read(CPmxDataBuffer& buffer)
 
         void execute(CPmxSession& session) override
         {
-            s_cLogger.debug() << "LbPmxVisa::CPmxSession::read::CReadCommand::execute" << " - "
-                              << "Executing GetData(...) method for fetching Pmx-Data for session " << &session;
+            s_cLogger.debug("LbPmxVisa::CPmxSession::read::CReadCommand::execute") << "Executing GetData(...) method for fetching Pmx-Data for session " << &session;
             CPmxDataBuffer::CSpill& reply = session.m_cReply;
             m_rBuffer.setSpill(&reply);
             if (session.m_bReplyHeld) {
@@ -317,14 +310,14 @@ void CPmxSession::read(CPmxDataBuffer& buffer)
         CPmxDataBuffer& m_rBuffer;
     };
 
-    s_cLogger.info() << "LbPmxVisa::CPmxSession::read" << " - " << "Reading from session " << this;
+    s_cLogger.info("LbPmxVisa::CPmxSession::read") << "Reading from session " << this;
     CReadCommand command(buffer);
     execute(command);
 }
 
 void CPmxSession::readSTB(std::uint16_t* status)
 {
-    s_cLogger.info() << "LbPmxVisa::CPmxSession::readSTB" << " - " << "Reading status byte register " << this;
+    s_cLogger.info("LbPmxVisa::CPmxSession::readSTB") << "Reading status byte register " << this;
     if (status == 0) {
         throw std::invalid_argument("NULL pointer status");
     }
@@ -350,7 +343,7 @@ void CPmxSession::clear()
     public:
         void execute(CPmxSession& session) override
         {
-            s_cLogger.info() << "LbPmxVisa::CPmxSession::clear::CClearCommand::execute" << " - " << "Clearing session "
+            s_cLogger.info("LbPmxVisa::CPmxSession::clear::CClearCommand::execute") << "Clearing session "
                              << &session;
             session.getParent()->callChecked(&CIPmxCommands::clearDevice, session);
             // The device has discarded its results: nothing is pending any more, so the status
@@ -376,12 +369,12 @@ void CPmxSession::changeState(const CIPmxSessionState* target)
 {
     LbCore::CLock<LbCore::CCriticalSection> lock(m_cStateLock);
     const CIPmxSessionState* current = m_pcState.load();
-    s_cLogger.debug() << "LbPmxVisa::CPmxSession::changeState" << " - " << "Changing state from " << current->getName()
+    s_cLogger.debug("LbPmxVisa::CPmxSession::changeState") << "Changing state from " << current->getName()
                       << " to " << target->getName() << " for session " << this;
     try {
         m_pcState = current->nextState(*this, target);
     } catch (const CIPmxSessionState::CPmxInvalidStateException&) {
-        s_cLogger.debug() << "LbPmxVisa::CPmxSession::changeState" << " - " << "---ERROR-- CPmxInvalidStateException "
+        s_cLogger.debug("LbPmxVisa::CPmxSession::changeState") << "---ERROR-- CPmxInvalidStateException "
                           << "Can't change state from " << current->getName() << " into state " << target->getName();
     }
 }

@@ -31,8 +31,7 @@ CPmxSessionDispatcher::CPmxCommandException::CPmxCommandException(std::int32_t c
 CPmxSessionDispatcher::CPmxSessionDispatcher()
     : m_pcCommand(0), m_sManufacturerName("Marlowe&Tenby"), m_nManufacturerId(3891)
 {
-    s_cLogger.debug() << "LbPmxVisa::CPmxSessionDispatcher::CPmxSessionDispatcher" << " - "
-                      << "CPmxSessionDispatcher created";
+    s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::CPmxSessionDispatcher") << "CPmxSessionDispatcher created";
 }
 
 CPmxSessionDispatcher::~CPmxSessionDispatcher()
@@ -57,7 +56,7 @@ void CPmxSessionDispatcher::attach(CIPmxCommands* commands)
     }
     self.m_pcCommand = commands;
     if (commands == 0) {
-        s_cLogger.error() << "LbPmxVisa::CPmxSessionDispatcher::attach" << " - " << "m_pcCommand has not been set...";
+        s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::attach") << "m_pcCommand has not been set...";
         return;
     }
     commands->setEventListener(&self);
@@ -70,8 +69,7 @@ void CPmxSessionDispatcher::detach(CIPmxCommands* commands)
         return;
     }
     if (self.getActiveSessionCount() != 0) {
-        s_cLogger.error() << "LbPmxVisa::CPmxSessionDispatcher::detach" << " - "
-                          << "Commands interface will be detached, when still some sessions are open. "
+        s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::detach") << "Commands interface will be detached, when still some sessions are open. "
                           << "This behavior is resulting in a undefined state";
     }
     self.m_pcCommand = 0;
@@ -95,7 +93,7 @@ boost::shared_ptr<CPmxSession> CPmxSessionDispatcher::getSession(const CPmxResou
 {
     CIPmxCommands* commands = getCommands();
     if (!commands->isDriverOpen()) {
-        s_cLogger.debug() << "LbPmxVisa::CPmxSessionDispatcher::getSession" << " - " << "Executing PmxOpenDriver(...)";
+        s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::getSession") << "Executing PmxOpenDriver(...)";
         callChecked(&CIPmxCommands::openDriver);
     }
     std::string key = g_pcVisaSerializer->serialize(resource);
@@ -120,7 +118,7 @@ boost::shared_ptr<CPmxSession> CPmxSessionDispatcher::getSession(const CPmxResou
             dead.swap(session);
         }
         if (session) {
-            s_cLogger.info() << "LbPmxVisa::CPmxSessionDispatcher::getSession" << " - " << "Recycle session for "
+            s_cLogger.info("LbPmxVisa::CPmxSessionDispatcher::getSession") << "Recycle session for "
                              << g_pcVisaSerializer->serialize(session->getResourceInfo());
             return session;
         }
@@ -139,14 +137,13 @@ std::vector<CPmxResourceInfo> CPmxSessionDispatcher::getAvailableDevices()
 {
     CIPmxCommands* commands = getCommands();
     if (!commands->isDriverOpen()) {
-        s_cLogger.debug() << "LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices" << " - "
-                          << "Executing PmxOpenDriver(...)";
+        s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Executing PmxOpenDriver(...)";
         callChecked(&CIPmxCommands::openDriver);
     }
     std::int32_t count = 0;
-    s_cLogger.debug() << "LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices" << " - " << "Getting device list length...";
+    s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Getting device list length...";
     callChecked(&CIPmxCommands::getDeviceListLength, &count);
-    s_cLogger.debug() << "LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices" << " - " << "Found " << count
+    s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Found " << count
                       << " device(s)...";
 
     std::vector<CPmxResourceInfo> devices;
@@ -160,11 +157,11 @@ std::vector<CPmxResourceInfo> CPmxSessionDispatcher::getAvailableDevices()
         try {
             callChecked(&CIPmxCommands::getDeviceInfo, index, name, type, serial, &flag);
         } catch (const CPmxCommandException& e) {
-            s_cLogger.warn() << "LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices" << " - " << "Skipping device "
+            s_cLogger.warn("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Skipping device "
                              << index << ", its information could not be read: " << e.what();
             continue;
         }
-        s_cLogger.debug() << "LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices" << " - " << "Adding device "
+        s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Adding device "
                           << type << ";" << serial;
         if (flag == 0) {
             continue;
@@ -172,11 +169,9 @@ std::vector<CPmxResourceInfo> CPmxSessionDispatcher::getAvailableDevices()
         try {
             devices.push_back(CPmxResourceInfo(type, serial));
         } catch (const std::exception& e) {
-            s_cLogger.error() << "LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices" << " - "
-                              << "Exception during adding to the resource info: " << e.what();
+            s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Exception during adding to the resource info: " << e.what();
         } catch (...) {
-            s_cLogger.error() << "LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices" << " - "
-                              << "Unknown exception during adding to the resource info";
+            s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Unknown exception during adding to the resource info";
         }
     }
     if (getCommands()->isDriverOpen() && getActiveSessionCount() == 0) {
@@ -189,8 +184,7 @@ unsigned CPmxSessionDispatcher::getActiveSessionCount()
 {
     CMapGuard guard(m_cMapLock);
     if (m_cSessionMap.size() != m_cResourceMap.size()) {
-        s_cLogger.warn() << "LbPmxVisa::CPmxSessionDispatcher::getActiveSessionCount" << " - "
-                         << "Session-Map and the Resource-Map are inconsistent!";
+        s_cLogger.warn("LbPmxVisa::CPmxSessionDispatcher::getActiveSessionCount") << "Session-Map and the Resource-Map are inconsistent!";
     }
     return static_cast<unsigned>(m_cResourceMap.size());
 }
@@ -217,8 +211,7 @@ void CPmxSessionDispatcher::detach(CPmxSession& session)
             m_cResourceMap.erase(byName);
         }
         if (m_cSessionMap.size() != m_cResourceMap.size()) {
-            s_cLogger.warn() << "LbPmxVisa::CPmxSessionDispatcher::detach" << " - "
-                             << "Session-Map and the Resource-Map are inconsistent!";
+            s_cLogger.warn("LbPmxVisa::CPmxSessionDispatcher::detach") << "Session-Map and the Resource-Map are inconsistent!";
         }
     }
     // Outside the map lock: closing the driver waits for the library's callback thread, which
@@ -241,12 +234,11 @@ void CPmxSessionDispatcher::findAndNotify(const CPmxEvent& event, PmxNotificatio
     CMapGuard guard(m_cMapLock);
     std::unordered_map<std::int64_t, CPmxSession*>::iterator found = m_cSessionMap.find(event.handle);
     if (found == m_cSessionMap.end()) {
-        s_cLogger.error() << "LbPmxVisa::CPmxSessionDispatcher::findAndNotify" << " - "
-                          << "Could not find a event listener for session " << event.handle;
+        s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::findAndNotify") << "Could not find a event listener for session " << event.handle;
         return;
     }
     CPmxSession* session = found->second;
-    s_cLogger.debug() << "LbPmxVisa::CPmxSessionDispatcher::findAndNotify" << " - " << "Firing event " << event.value
+    s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::findAndNotify") << "Firing event " << event.value
                       << " for session " << session;
     CIPmxEventListener& listener = session->getEventDispatcher();
     (listener.*operation)(event);

@@ -19,7 +19,7 @@ namespace {
 // message the waiting writer simply sees no answer and ends at its time-out.
 void logLostMessage(const CPmxSession* session)
 {
-    s_cLogger.error() << "LbPmxVisa::CPmxSession::notify" << " - " << "Could not create a message for session "
+    s_cLogger.error("LbPmxVisa::CPmxSession::notify") << "Could not create a message for session "
                       << session;
 }
 
@@ -106,14 +106,12 @@ void CPmxSession::notifyDeviceChangedEvent(const CPmxEvent&)
     bool removed = false;
     try {
         if (isSensorAttached()) {
-            s_cLogger.debug() << "LbPmxVisa::CPmxSession::notifyDeviceChangedEvent" << " - "
-                              << "Sensor still attached, nothing changes for session " << this;
+            s_cLogger.debug("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent") << "Sensor still attached, nothing changes for session " << this;
             return;
         }
         removed = true;
     } catch (const std::exception& e) {
-        s_cLogger.warn() << "LbPmxVisa::CPmxSession::notifyDeviceChangedEvent" << " - "
-                         << "Could not read the device list: " << e.what();
+        s_cLogger.warn("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent") << "Could not read the device list: " << e.what();
     }
     clearMessages();
     if (removed) {
@@ -125,7 +123,7 @@ void CPmxSession::notifyDeviceChangedEvent(const CPmxEvent&)
             m_cMessageQueue.push(message, 0);
         }
     }
-    s_cLogger.warn() << "LbPmxVisa::CPmxSession::notifyDeviceChangedEvent" << " - " << "Device has been changed for session "
+    s_cLogger.warn("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent") << "Device has been changed for session "
                      << this;
     changeState(CIPmxSessionState::noData());
 }

@@ -96,7 +96,7 @@ protected:
 TEST_F(CLogTest, LineCarriesDateTimeLevelLoggerAndPieces)
 {
     int before = localHour();
-    m_cLogger.warn() << "LbCore::CTest::op" << " - " << "value " << 42 << ' ' << 7u << ' ' << 18446744073709551615ull;
+    m_cLogger.warn("LbCore::CTest::op") << "value " << 42 << ' ' << 7u << ' ' << 18446744073709551615ull;
     int after = localHour();
     std::vector<std::string> lines = m_cCapture.lines();
     ASSERT_EQ(1u, lines.size());
@@ -225,7 +225,7 @@ TEST_F(CLogTest, TwoThreadsWriteWholeLines)
         auto writer = [](const char* name) {
             CLogger logger = CLogManager::getLogger(name);
             for (int i = 0; i < kLines; ++i) {
-                logger.info() << "LbCore::CTest::write" << " - " << "line " << i << " of " << name;
+                logger.info("LbCore::CTest::write") << "line " << i << " of " << name;
             }
         };
         std::thread a(writer, "CWriterA");
@@ -261,8 +261,8 @@ TEST_F(CLogTest, UnwrittenMessagesBuildAndAllocateNothing)
 {
     int value = 7;
     auto logAll = [&] {
-        m_cLogger.debug() << "LbCore::CTest::op" << " - " << "value " << value << ' ' << 3u << ' ' << &value;
-        m_cLogger.info() << "LbCore::CTest::op" << " - " << "info";
+        m_cLogger.debug("LbCore::CTest::op") << "value " << value << ' ' << 3u << ' ' << &value;
+        m_cLogger.info("LbCore::CTest::op") << "info";
     };
     CLogManager::setLevel(LEVEL_WARN); // below the threshold, an appender attached
     unsigned long before = s_nAllocations;
@@ -289,11 +289,11 @@ TEST_F(CLogTest, OutputIsTheSameAtEveryLevelWithAndWithoutAFile)
 {
     CSelfWriter writer;
     auto logAll = [&](CLogger& logger) {
-        logger.debug() << "LbCore::CTest::op" << " - " << "d " << 1 << ' ' << &writer;
-        logger.info() << "LbCore::CTest::op" << " - " << "i " << 2u;
-        logger.warn() << "LbCore::CTest::op" << " - " << "w " << 18446744073709551615ull;
-        logger.error() << "LbCore::CTest::op" << " - " << std::runtime_error("e");
-        logger.fatal() << "LbCore::CTest::op" << " - " << "f";
+        logger.debug("LbCore::CTest::op") << "d " << 1 << ' ' << &writer;
+        logger.info("LbCore::CTest::op") << "i " << 2u;
+        logger.warn("LbCore::CTest::op") << "w " << 18446744073709551615ull;
+        logger.error("LbCore::CTest::op") << std::runtime_error("e");
+        logger.fatal("LbCore::CTest::op") << "f";
     };
     const std::string tails[] = {"[DEBUG] CTestLogger - LbCore::CTest::op - d 1 session 0x0003::100000",
                                  "[INFO ] CTestLogger - LbCore::CTest::op - i 2",
