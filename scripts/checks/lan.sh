@@ -1,0 +1,77 @@
+#!/usr/bin/env bash
+# End-to-end check of the LAN gateway with a VISA client that knows nothing of the passport:
+# starts rpcbind (when none runs; only the one started here is stopped again), starts
+# lbpmx-lan of the native build against the built runtime, passport and simulated sensors
+# (the two default sensors), runs tests/lan_pyvisa.py with Debian's pyvisa-py, then stops the
+# gateway with SIGTERM and expects a clean exit that also leaves rpcbind. Every wait is bounded.
+# LB_DEV_BUILD_DIR chooses another build folder.
+set -uo pipefail
+cd "$(dirname "$0")/../.."
+dev=${LB_DEV_BUILD_DIR:-build/dev}
+unset LBVISA_PASSPORTS PMXSIM_DEVICES
+gateway="$PWD/$dev/bin/lbpmx-lan"
+shim="$PWD/$dev/bin/lan_simcontrol.so"
+for f in "$gateway" "$shim" "$PWD/$dev/bin/LbViPmx64.so"; do
+  [ -f "$f" ] || { echo "missing $f"; exit 1; }
+done
+command -v rpcbind >/dev/null && command -v rpcinfo >/dev/null || { echo "rpcbind is not installed"; exit 1; }
+
+work=$(mktemp -d)
+rpcbind_pid=""; gateway_pid=""
+cleanup() {
+  [ -n "$gateway_pid" ] && kill -KILL "$gateway_pid" 2>/dev/null
+  [ -n "$rpcbind_pid" ] && kill -TERM "$rpcbind_pid" 2>/dev/null && wait "$rpcbind_pid" 2>/dev/null
+  rm -rf "$work"
+}
+trap cleanup EXIT
+fail() { echo "FAILED: $*"; echo "--- gateway log:"; cat "$work/gateway.log" 2>/dev/null; exit 1; }
+# Polls a readiness condition for at most ~10 s (a process start, not a test's synchronisation).
+wait_for() { for _ in $(seq 100); do eval "$1" && return 0; sleep 0.1; done; return 1; }
+
+if ! timeout 5 rpcinfo -p 127.0.0.1 >/dev/null 2>&1; then
+  rpcbind -f -w >"$work/rpcbind.log" 2>&1 &
+  rpcbind_pid=$!
+  wait_for 'timeout 2 rpcinfo -p 127.0.0.1 >/dev/null 2>&1' || fail "rpcbind did not start"
+fi
+
+# Free ports for the raw sockets: other builds may use 5025 on this machine.
+base=$(/usr/bin/python3 -I -c '
+import socket
+for base in range(20000, 60000, 97):
+    try:
+        s = [socket.socket() for _ in range(2)]
+        for i, x in enumerate(s): x.bind(("127.0.0.1", base + i))
+        print(base); break
+    except OSError: pass
+    finally:
+        for x in s: x.close()')
+
+# Settings from a config file and flags, as a service would have them.
+cat >"$work/lan.conf" <<CONF
+# lbpmx-lan test settings
+allow = 127.0.0.1/32
+max-links = 2
+idle-timeout = 60
+CONF
+mkfifo "$work/ctl" "$work/ack"
+
+listing=$(timeout 60 "$gateway" --list 2>/dev/null) || fail "--list failed"
+echo "$listing" | grep -q '^inst0 100000 LBPMX::0x0003::100000::INSTR$' || fail "--list printed: $listing"
+echo "$listing" | grep -q '^inst1 100001 ' || fail "--list printed: $listing"
+
+LD_PRELOAD="$shim" LBPMX_LAN_SIMCTL="$work" timeout 300 "$gateway" --config "$work/lan.conf" \
+  --max-links 6 --socket-port "$base" --log "$work/gateway.log" &
+gateway_pid=$!
+wait_for "grep -q 'serving' '$work/gateway.log' 2>/dev/null" || fail "the gateway did not start"
+
+timeout 240 /usr/bin/python3 -I tests/lan_pyvisa.py "$base" "$work" || fail "pyvisa-py test"
+
+kill -TERM "$gateway_pid"
+rc=0
+wait_for "! kill -0 $gateway_pid 2>/dev/null" || fail "no exit after SIGTERM"
+wait "$gateway_pid"; rc=$?; gateway_pid=""
+[ "$rc" -eq 0 ] || fail "exit code $rc after SIGTERM"
+grep -q "SIGTERM received, shutting down" "$work/gateway.log" && grep -q "stopped" "$work/gateway.log" \
+  || fail "no clean shutdown in the log"
+if timeout 5 rpcinfo -p 127.0.0.1 2>/dev/null | grep -q ' 395183 '; then fail "still registered with rpcbind"; fi
+echo "LAN gateway check passed"
