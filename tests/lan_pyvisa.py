@@ -118,6 +118,46 @@ def error_codes():
     step("VXI-11 error codes: not accessible, invalid link, parameter, I/O timeout, no lock")
 
 
+def service_request():
+    server = socket.socket()
+    server.bind((HOST, 0))
+    server.listen(4)
+    server.settimeout(10)
+    client = vxi11.CoreClient(HOST)
+    try:
+        error, link, _, _ = client.create_link(3, 0, 0, "inst0")
+        assert error == 0, error
+        host = int.from_bytes(socket.inet_aton(HOST), "big")
+        intr_prog, tcp = 0x0607B1, 0
+        # pyvisa-py's create_intr_chan packs the wrong structure; the call is made with the right one.
+        params = (host, server.getsockname()[1], intr_prog, 1, tcp)
+        assert client.make_call(vxi11.CREATE_INTR_CHAN, params, client.packer.pack_device_remote_func_parms,
+                                client.unpacker.unpack_device_error) == 0
+        assert client.device_enable_srq(link, True, b"srq-1") == 0
+        assert client.device_write(link, 5000, 0, 8, b"INIT\n")[0] == 0  # the trigger state changes
+        conn, _ = server.accept()
+        conn.settimeout(10)
+        record = b""
+        while len(record) < 4 or len(record) < 4 + (int.from_bytes(record[:4], "big") & 0x7FFFFFFF):
+            chunk = conn.recv(4096)
+            assert chunk, "interrupt channel closed early"
+            record += chunk
+        conn.close()
+        words = [int.from_bytes(record[i:i + 4], "big") for i in range(4, 48, 4)]
+        # xid, CALL, RPC version 2, program, version, device_intr_srq, null credentials and verifier
+        assert words[1:6] == [0, 2, intr_prog, 1, 30], words
+        assert words[10] == 5 and record[48:53] == b"srq-1", record
+        client.device_read(link, 1000, 5000, 0, 0, 0)  # the measurement of INIT
+        assert client.device_enable_srq(link, False, b"") == 0
+        assert client.destroy_intr_chan() == 0
+        assert client.destroy_intr_chan() == 6  # no channel
+        client.destroy_link(link)
+    finally:
+        client.close()
+        server.close()
+    step("a service request reached the client's interrupt channel")
+
+
 def raw_socket(rm, base):
     sock = rm.open_resource("TCPIP::%s::%d::SOCKET" % (HOST, base))
     sock.timeout = 5000
@@ -263,6 +303,7 @@ def main(base, control):
         inst = measurement_and_trace(rm)
         locking(rm, inst)
         error_codes()
+        service_request()
         raw_socket(rm, base)
         several_clients()
         link_limit()
