@@ -1,6 +1,6 @@
 #include "tools/lan/Config.h"
 
-#include <arpa/inet.h>
+#include "tools/lan/Socket.h"
 
 #include <cstdarg>
 #include <cstdlib>
@@ -61,8 +61,8 @@ bool applySetting(const std::string& key, const std::string& value, bool hasValu
         return false;
     }
     if (key == "bind") {
-        in_addr a;
-        ok = inet_pton(AF_INET, value.c_str(), &a) == 1;
+        std::uint32_t a;
+        ok = parseIpv4(value, a);
         if (ok) c.m_strBind = value;
     } else if (key == "allow") {
         ok = c.m_cAllow.add(value);
@@ -120,12 +120,12 @@ bool CAllowList::add(const std::string& text)
         if (slash != std::string::npos && !parseUnsigned(word.substr(slash + 1), 32, bits)) {
             return false;
         }
-        in_addr a;
-        if (inet_pton(AF_INET, word.substr(0, slash).c_str(), &a) != 1) {
+        std::uint32_t address;
+        if (!parseIpv4(word.substr(0, slash), address)) {
             return false;
         }
         std::uint32_t mask = bits == 0 ? 0 : ~std::uint32_t(0) << (32 - bits);
-        m_vecNetworks.push_back(CNetwork{ntohl(a.s_addr) & mask, mask});
+        m_vecNetworks.push_back(CNetwork{address & mask, mask});
     }
     return true;
 }
@@ -221,7 +221,11 @@ void CLanLog::line(const char* format, ...)
     char stamp[32];
     std::time_t now = std::time(0);
     std::tm tm;
+#if defined(_WIN32)
+    localtime_s(&tm, &now);
+#else
     localtime_r(&now, &tm);
+#endif
     std::strftime(stamp, sizeof stamp, "%Y-%m-%d %H:%M:%S", &tm);
     std::lock_guard<std::mutex> guard(m_cMutex);
     std::fprintf(m_pFile, "%s lbpmx-lan: ", stamp);

@@ -1,6 +1,7 @@
 #include "tools/lan/Gateway.h"
 
 #include <algorithm>
+#include <cctype>
 #include <chrono>
 #include <cstdint>
 #include <cstring>

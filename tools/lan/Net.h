@@ -15,6 +15,8 @@
 #include <string>
 #include <thread>
 
+#include "tools/lan/Socket.h"
+
 namespace LbPmxLan {
 
 class CAllowList;
@@ -23,7 +25,7 @@ class CLanLog;
 // A connected socket handed to a connection's handler.
 class CConnection {
 public:
-    CConnection(int fd, std::uint32_t peer, unsigned idleSeconds);
+    CConnection(TSocket socket, std::uint32_t peer, unsigned idleSeconds);
     ~CConnection();
     // Fills exactly `size` bytes; false on close, error, stop or when the peer stays silent
     // for the idle timeout.
@@ -39,8 +41,7 @@ public:
     std::string peerText() const;
 
 private:
-    bool waitReadable();
-    int m_nFd;
+    TSocket m_nSocket;
     std::uint32_t m_nPeer;
     int m_nIdleMs;
 };
@@ -72,7 +73,7 @@ private:
     CLanLog& m_cLog;
     const CAllowList& m_cAllow;
     unsigned m_nIdleSeconds;
-    int m_nFd = -1;
+    TSocket m_nListener = NO_SOCKET;
     unsigned m_nPort = 0;
     FConnectionHandler m_fHandler;
     std::thread m_cAcceptThread;
@@ -81,8 +82,6 @@ private:
     std::list<std::unique_ptr<CWorker>> m_lstWorkers;
 };
 
-// Opens a TCP connection within timeoutMs; -1 on failure.
-int connectTcp(std::uint32_t hostOrderAddress, unsigned port, int timeoutMs);
 
 } // namespace LbPmxLan
 

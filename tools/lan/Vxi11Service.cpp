@@ -121,12 +121,12 @@ public:
         return link->enableSrq(true, [channel, handle, &log] {
             std::vector<std::uint8_t> call;
             if (!channel || !encodeSrqCall(s_nNextXid++, handle, call)) return;
-            int fd = connectTcp(channel->m_nAddress, channel->m_nPort, SRQ_CONNECT_TIMEOUT_MS);
-            if (fd < 0) {
+            TSocket socket = socketConnect(channel->m_nAddress, channel->m_nPort, SRQ_CONNECT_TIMEOUT_MS);
+            if (socket == NO_SOCKET) {
                 log.line("service request: interrupt channel unreachable");
                 return;
             }
-            CConnection(fd, channel->m_nAddress, 1).writeAll(call.data(), call.size());
+            CConnection(socket, channel->m_nAddress, 1).writeAll(call.data(), call.size());
         });
     }
     long destroyLink(Device_Link lid) override
