@@ -1,7 +1,12 @@
 // lbpmx-lan: serves every sensor the VISA library finds over VXI-11 (TCPIP::host::instN::INSTR)
-// and raw SCPI sockets (TCPIP::host::port::SOCKET). SIGTERM or SIGINT shut it down cleanly:
-// listeners close, links are destroyed (releasing their locks), rpcbind forgets the gateway.
+// and raw SCPI sockets (TCPIP::host::port::SOCKET). SIGTERM or SIGINT (on Windows a console
+// Ctrl+C, Ctrl+Break or close) shut it down cleanly: listeners close, links are destroyed
+// (releasing their locks), rpcbind forgets the gateway.
+#if defined(_WIN32)
+#include <windows.h>
+#else
 #include <signal.h>
+#endif
 
 #include <cstdio>
 #include <ctime>
@@ -10,14 +15,66 @@
 #include "tools/lan/Config.h"
 #include "tools/lan/Gateway.h"
 #include "tools/lan/SocketListener.h"
+#if defined(LBPMX_LAN_VXI11)
 #include "tools/lan/Vxi11Service.h"
+#endif
 
 using namespace LbPmxLan;
 
 namespace {
+
 // How often sensors are looked for again, so one plugged in later gets its socket.
-constexpr long RESCAN_SECONDS = 5;
+constexpr unsigned RESCAN_SECONDS = 5;
+
+#if defined(_WIN32)
+HANDLE s_hStop = nullptr;
+
+BOOL WINAPI onConsoleEvent(DWORD)
+{
+    SetEvent(s_hStop);
+    return TRUE;
 }
+
+void blockStopSignals()
+{
+    s_hStop = CreateEventA(nullptr, TRUE, FALSE, nullptr);
+    SetConsoleCtrlHandler(onConsoleEvent, TRUE);
+}
+
+const char* const STOP_HINT = "serving; stop with Ctrl+C";
+
+// Calls `rescan` every RESCAN_SECONDS until a stop is requested; returns its name.
+template <class TRescan>
+const char* waitForStop(TRescan rescan)
+{
+    while (WaitForSingleObject(s_hStop, RESCAN_SECONDS * 1000) == WAIT_TIMEOUT) rescan();
+    return "stop request";
+}
+#else
+sigset_t s_cStopSignals;
+const char* const STOP_HINT = "serving; stop with SIGTERM";
+
+// Signals are taken by sigtimedwait; every thread started from here on blocks them.
+void blockStopSignals()
+{
+    sigemptyset(&s_cStopSignals);
+    sigaddset(&s_cStopSignals, SIGTERM);
+    sigaddset(&s_cStopSignals, SIGINT);
+    pthread_sigmask(SIG_BLOCK, &s_cStopSignals, nullptr);
+    signal(SIGPIPE, SIG_IGN);
+}
+
+template <class TRescan>
+const char* waitForStop(TRescan rescan)
+{
+    timespec wait = {static_cast<time_t>(RESCAN_SECONDS), 0};
+    int signal;
+    while ((signal = sigtimedwait(&s_cStopSignals, nullptr, &wait)) < 0) rescan();
+    return signal == SIGTERM ? "SIGTERM" : "SIGINT";
+}
+#endif
+
+} // namespace
 
 int main(int argc, char** argv)
 {
@@ -32,13 +89,11 @@ int main(int argc, char** argv)
         std::fputs(USAGE, stdout);
         return 0;
     }
-    // Signals are taken by sigtimedwait below; every thread started from here on blocks them.
-    sigset_t stopSignals;
-    sigemptyset(&stopSignals);
-    sigaddset(&stopSignals, SIGTERM);
-    sigaddset(&stopSignals, SIGINT);
-    pthread_sigmask(SIG_BLOCK, &stopSignals, nullptr);
-    signal(SIGPIPE, SIG_IGN);
+    blockStopSignals();
+    if (!socketStartup()) {
+        std::fprintf(stderr, "lbpmx-lan: networking is not available\n");
+        return 1;
+    }
 
     CLanLog log;
     if (!log.open(config.m_strLog)) {
@@ -57,21 +112,27 @@ int main(int argc, char** argv)
     }
     int status = 0;
     {
+#if defined(LBPMX_LAN_VXI11)
         CVxi11Service vxi11(gateway, config, log);
+        bool started = !config.m_bVxi11 || vxi11.start();
+#else
+        if (config.m_bVxi11) {
+            log.line("VXI-11 is not part of this build (no ONC RPC library); serving raw sockets only");
+        }
+        bool started = true;
+#endif
         CSocketListeners sockets(gateway, config, log);
-        if ((config.m_bVxi11 && !vxi11.start()) || !sockets.update()) {
+        if (!started || !sockets.update()) {
             status = 1;
         } else {
-            log.line("serving; stop with SIGTERM");
-            timespec wait = {RESCAN_SECONDS, 0};
-            int signal;
-            while ((signal = sigtimedwait(&stopSignals, nullptr, &wait)) < 0) {
-                sockets.update();
-            }
-            log.line("%s received, shutting down", signal == SIGTERM ? "SIGTERM" : "SIGINT");
+            log.line("%s", STOP_HINT);
+            const char* reason = waitForStop([&sockets] { sockets.update(); });
+            log.line("%s received, shutting down", reason);
         }
         sockets.stop();
+#if defined(LBPMX_LAN_VXI11)
         vxi11.stop();
+#endif
     }
     log.line("stopped");
     return status;
