@@ -77,7 +77,7 @@ CLink::~CLink()
         viUnlock(m_nSession);
     }
     viClose(m_nSession);
-    m_cGateway.released(m_cSensor, m_bLocked);
+    m_cGateway.released(m_cSensor);
 }
 
 ViStatus CLink::setTimeout(unsigned long ms)
@@ -258,17 +258,17 @@ ViStatus _VI_FUNCH CLink::onServiceRequest(ViSession, ViEventType, ViEvent, ViAd
 
 long CLink::enableSrq(bool enable, std::function<void()> srq)
 {
-    std::uintptr_t id = reinterpret_cast<std::uintptr_t>(this);
-    if (m_bSrq) {
+    if (m_nSrqId != 0) {
         viDisableEvent(m_nSession, VI_EVENT_SERVICE_REQ, VI_HNDLR);
-        viUninstallHandler(m_nSession, VI_EVENT_SERVICE_REQ, onServiceRequest, reinterpret_cast<ViAddr>(id));
+        viUninstallHandler(m_nSession, VI_EVENT_SERVICE_REQ, onServiceRequest, reinterpret_cast<ViAddr>(m_nSrqId));
         std::lock_guard<std::mutex> guard(s_cSrqMutex);
-        s_mapSrq.erase(id);
-        m_bSrq = false;
+        s_mapSrq.erase(m_nSrqId);
+        m_nSrqId = 0;
     }
     if (!enable) {
         return VXI11_OK;
     }
+    std::uintptr_t id;
     {
         std::lock_guard<std::mutex> guard(s_cSrqMutex);
         id = s_nNextSrq++;
@@ -277,13 +277,16 @@ long CLink::enableSrq(bool enable, std::function<void()> srq)
     ViStatus status = viInstallHandler(m_nSession, VI_EVENT_SERVICE_REQ, onServiceRequest, reinterpret_cast<ViAddr>(id));
     if (status >= VI_SUCCESS) {
         status = viEnableEvent(m_nSession, VI_EVENT_SERVICE_REQ, VI_HNDLR, VI_NULL);
+        if (status < VI_SUCCESS) {
+            viUninstallHandler(m_nSession, VI_EVENT_SERVICE_REQ, onServiceRequest, reinterpret_cast<ViAddr>(id));
+        }
     }
-    std::lock_guard<std::mutex> guard(s_cSrqMutex);
     if (status < VI_SUCCESS) {
+        std::lock_guard<std::mutex> guard(s_cSrqMutex);
         s_mapSrq.erase(id);
         return vxi11ErrorOf(status);
     }
-    m_bSrq = true;
+    m_nSrqId = id;
     return VXI11_OK;
 }
 
@@ -403,7 +406,7 @@ std::unique_ptr<CLink> CGateway::open(const std::string& device, long& error)
     if (status < VI_SUCCESS) {
         m_cLog.line("inst%u: cannot open %s (status 0x%08X)", sensor->m_nIndex, resource.c_str(),
                     static_cast<unsigned>(status));
-        released(*sensor, false);
+        released(*sensor);
         error = VXI11_NOT_ACCESSIBLE;
         return nullptr;
     }
@@ -411,7 +414,7 @@ std::unique_ptr<CLink> CGateway::open(const std::string& device, long& error)
     return std::unique_ptr<CLink>(new CLink(*this, *sensor, vi));
 }
 
-void CGateway::released(CSensor& sensor, bool)
+void CGateway::released(CSensor& sensor)
 {
     std::lock_guard<std::mutex> guard(m_cMutex);
     --sensor.m_nLinks;

@@ -11,6 +11,7 @@
 
 #include <atomic>
 #include <condition_variable>
+#include <cstdint>
 #include <functional>
 #include <map>
 #include <memory>
@@ -86,7 +87,7 @@ private:
     CSensor& m_cSensor;
     ViSession m_nSession;
     bool m_bLocked = false;
-    bool m_bSrq = false;
+    std::uintptr_t m_nSrqId = 0; // the handler's number while service requests are enabled
     unsigned long m_nTimeout = 0;
     std::string m_strPending; // read data beyond a termination character
     std::function<void()> m_fSrq;
@@ -109,7 +110,7 @@ public:
 private:
     friend class CLink;
     CSensor* find(const std::string& device);
-    void released(CSensor& sensor, bool locked);
+    void released(CSensor& sensor);
 
     CLanLog& m_cLog;
     unsigned m_nMaxLinks;
