@@ -1,0 +1,36 @@
+// The VXI-11 service: the core channel (links, I/O, locks, SRQ set-up) and the abort channel,
+// each on a listener of its own, the core channel registered with the local rpcbind. A link
+// belongs to the connection that created it; when the connection ends (the client closed it,
+// vanished, or stayed idle too long) its links are destroyed, which releases their locks.
+#ifndef LBPMX_LAN_VXI11SERVICE_H
+#define LBPMX_LAN_VXI11SERVICE_H
+
+#include <memory>
+
+#include "tools/lan/Net.h"
+
+namespace LbPmxLan {
+
+class CGateway;
+struct CLanConfig;
+
+class CVxi11Service {
+public:
+    CVxi11Service(CGateway& gateway, const CLanConfig& config, CLanLog& log);
+    ~CVxi11Service();
+    bool start();
+    void stop(); // unregisters, closes every connection and link
+    unsigned corePort() const { return m_cCore.port(); }
+
+private:
+    CGateway& m_cGateway;
+    const CLanConfig& m_cConfig;
+    CLanLog& m_cLog;
+    CListener m_cCore;
+    CListener m_cAbort;
+    bool m_bRegistered = false;
+};
+
+} // namespace LbPmxLan
+
+#endif
