@@ -149,8 +149,8 @@ ViStatus CLbPmxInstrSesn::viOpen(ViConstRsrc name, ViAccessMode, ViUInt32)
     CPassportLock lock;
     try {
         CPmxSessionDispatcher& dispatcher = CPmxSessionDispatcher::getInstance();
-        if (dispatcher.getActiveSessionCount() > MAX_ACTIVE_SESSIONS) {
-            s_cLogger.warn(OPERATION) << "There are already " << MAX_ACTIVE_SESSIONS << " active devices...";
+        if (dispatcher.getActiveSessionCount() > MAX_OPEN_BEFORE_OPEN) {
+            s_cLogger.warn(OPERATION) << "There are already " << MAX_OPEN_BEFORE_OPEN << " active devices...";
             return VI_ERROR_RSRC_NFOUND;
         }
         m_pcSession = dispatcher.getSession(CPmxResourceInfo(name == 0 ? std::string() : std::string(name)));
@@ -160,7 +160,7 @@ ViStatus CLbPmxInstrSesn::viOpen(ViConstRsrc name, ViAccessMode, ViUInt32)
         } catch (...) {
         }
         if (m_pcRecord != 0) {
-            m_pcRecord[2] = static_cast<CBasePassport*>(this);
+            m_pcRecord[CNiViSv::RECORD_PASSPORT_SLOT] = static_cast<CBasePassport*>(this);
         }
         return CNiViSv::installTable(m_nSession, getVectorTable(), 0, m_nSession, 0);
     } catch (const std::exception& e) {
@@ -176,7 +176,7 @@ ViStatus CLbPmxInstrSesn::viClose()
 {
     CPassportLock lock;
     if (m_pcRecord != 0) {
-        m_pcRecord[2] = 0;
+        m_pcRecord[CNiViSv::RECORD_PASSPORT_SLOT] = 0;
         m_pcRecord = 0;
     }
     if (m_nClosingFromDestructor == 0) {

@@ -89,7 +89,9 @@ public:
     // VI_ATTR_RSRC_IMPL_VERSION from a build date "Mmm dd yyyy" and the file version.
     static ViUInt32 implementationVersion(const char* buildDate, unsigned major, unsigned minor);
 
-    static constexpr unsigned MAX_ACTIVE_SESSIONS = 127;
+    // An open is refused while more than this many sensor sessions exist, so at most one more,
+    // MAX_OPEN_BEFORE_OPEN + 1 = 128, can exist at a time.
+    static constexpr unsigned MAX_OPEN_BEFORE_OPEN = 127;
 
 private:
     ViStatus getAttribute(ViAttr attribute, void* value);

@@ -15,7 +15,7 @@
 
 namespace LbPmxPassport {
 
-bool queryConfigurationValue(const char* name, char (&buffer)[80], unsigned& size)
+bool queryConfigurationValue(const char* name, char (&buffer)[CONFIGURATION_VALUE_SIZE], unsigned& size)
 {
     const char* value = std::getenv((std::string("LBVIPMX_") + name).c_str());
     if (value == 0) {

@@ -6,7 +6,7 @@
 
 namespace LbPmxPassport {
 
-bool queryConfigurationValue(const char* name, char (&buffer)[80], unsigned& size)
+bool queryConfigurationValue(const char* name, char (&buffer)[CONFIGURATION_VALUE_SIZE], unsigned& size)
 {
     HKEY key = 0;
     if (RegOpenKeyExA(HKEY_LOCAL_MACHINE,

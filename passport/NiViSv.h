@@ -47,8 +47,9 @@ class CNiViSv {
   // 56: installs a vector table on a session.
   static ViStatus installTable(ViSession nVi, THandle hTable, ViUInt32 nReserved,
                                ViSession nTarget, ViUInt32 nReserved2);
-  // 57: the runtime's record of a session; its third field is the passport's slot.
+  // 57: the runtime's record of a session; its field RECORD_PASSPORT_SLOT is the passport's slot.
   static ViAddr *sessionRecord(ViSession nVi);
+  static constexpr int RECORD_PASSPORT_SLOT = 2;
   // 63: announces the passport's detach.
   static ViStatus detach();
 };

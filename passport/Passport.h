@@ -47,9 +47,12 @@ LbPmxVisa::CPmxControl& getAdapter();
 // Reads LOG_LEVEL and LOG_FILE and configures logging by their rules.
 void readConfiguration();
 
-// One configuration value (at most 80 bytes including its terminating zero) into buffer;
-// false when it is missing or longer. One implementation per platform.
-bool queryConfigurationValue(const char* name, char (&buffer)[80], unsigned& size);
+// The size of a configuration value's buffer, terminating zero included.
+const unsigned CONFIGURATION_VALUE_SIZE = 80;
+
+// One configuration value (at most CONFIGURATION_VALUE_SIZE bytes including its terminating zero)
+// into buffer; false when it is missing or longer. One implementation per platform.
+bool queryConfigurationValue(const char* name, char (&buffer)[CONFIGURATION_VALUE_SIZE], unsigned& size);
 
 } // namespace LbPmxPassport
 

@@ -35,7 +35,7 @@ LbCore::CLogger s_cLogger = LbCore::CLogManager::getLogger("CLbPmxInstrSesn");
 CBasePassport* objectOf(ViSession session)
 {
     ViAddr* record = CNiViSv::sessionRecord(session);
-    return record == 0 ? 0 : static_cast<CBasePassport*>(record[2]);
+    return record == 0 ? 0 : static_cast<CBasePassport*>(record[CNiViSv::RECORD_PASSPORT_SLOT]);
 }
 
 // Each entry function forwards to the session's object. A handle without an object (never
@@ -316,7 +316,7 @@ void detachProcess(EDetach kind)
 namespace {
 // The text of a value, never read past its buffer: a value without a terminating zero within
 // its bytes ends at the buffer's end.
-std::string textOf(const char (&buffer)[80], unsigned size)
+std::string textOf(const char (&buffer)[CONFIGURATION_VALUE_SIZE], unsigned size)
 {
     std::size_t length = 0;
     while (length < size && length < sizeof buffer && buffer[length] != '\0') {
@@ -328,9 +328,9 @@ std::string textOf(const char (&buffer)[80], unsigned size)
 void readLogFile()
 {
     static std::unique_ptr<LbCore::CLogFileAppender> s_pcAppender;
-    char buffer[80] = {0};
+    char buffer[CONFIGURATION_VALUE_SIZE] = {0};
     unsigned size = 0;
-    if (!queryConfigurationValue("LOG_FILE", buffer, size) || size < 1 || size > 80 || s_pcAppender) {
+    if (!queryConfigurationValue("LOG_FILE", buffer, size) || size < 1 || size > CONFIGURATION_VALUE_SIZE || s_pcAppender) {
         return;
     }
     s_pcAppender.reset(new LbCore::CLogFileAppender(textOf(buffer, size)));
@@ -339,13 +339,13 @@ void readLogFile()
 
 void readConfiguration()
 {
-    char buffer[80] = {0};
+    char buffer[CONFIGURATION_VALUE_SIZE] = {0};
     unsigned size = 0;
-    if (!queryConfigurationValue("LOG_LEVEL", buffer, size) || size < 1 || size > 80) {
+    if (!queryConfigurationValue("LOG_LEVEL", buffer, size) || size < 1 || size > CONFIGURATION_VALUE_SIZE) {
         return;
     }
     // Compared byte for byte including the terminating zero: no case folding, no trimming. A
-    // value that fills all 80 bytes without a zero is no text at all.
+    // value that fills its whole buffer without a zero is no text at all.
     if (std::memchr(buffer, '\0', sizeof buffer) == 0) {
         return;
     }

@@ -32,6 +32,10 @@ public:
 
 typedef void (CIPmxEventListener::*PmxNotification)(const CPmxEvent&);
 
+// Trigger states of the library's getTriggerState that the emulated instrument shows.
+const std::int32_t PMX_TRIGGER_WAITING = 2;   // armed, waiting for its trigger
+const std::int32_t PMX_TRIGGER_MEASURING = 3; // triggered, measuring
+
 // Library result codes the system gives a meaning of its own.
 const std::int32_t PMX_NO_FURTHER_RESULT = static_cast<std::int32_t>(0xC000000Au);
 const std::int32_t PMX_BENIGN_ERROR = static_cast<std::int32_t>(0xD0000007u);

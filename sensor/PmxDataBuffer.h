@@ -70,7 +70,6 @@ public:
 
     char* getPosition() const { return m_pcPosition; }
     std::uint32_t getCount() const { return *m_pnCount; }
-    std::size_t getCapacity() const { return m_nCapacity; }
     std::size_t getRoom() const;
 
 private:

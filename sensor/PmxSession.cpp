@@ -244,7 +244,7 @@ void CPmxSession::write(const std::string& command)
             break;
         }
         case CPmxScpiCommandParser::COMMAND_OPERATION_CONDITION_QUERY: {
-            class CErrorQueueCommand : public CSessionCommand {
+            class COperationStatusCommand : public CSessionCommand {
             public:
                 void execute(CPmxSession& session) override
                 {
@@ -252,7 +252,7 @@ void CPmxSession::write(const std::string& command)
                     session.changeState(CIPmxSessionState::opStatusToNoData());
                 }
             };
-            static CErrorQueueCommand s_cCommand;
+            static COperationStatusCommand s_cCommand;
             execute(s_cCommand);
             break;
         }
@@ -323,16 +323,16 @@ void CPmxSession::readSTB(std::uint16_t* status)
     }
     std::uint8_t flags = 0;
     if (!m_cErrorQueue.isEmpty()) {
-        flags |= 4;
+        flags |= STB_ERROR_QUEUE;
     }
     // A kept reply is an answer waiting to be read as much as a pending result is.
     if (getState() == CIPmxSessionState::dataAvailable() || m_bReplyHeld) {
-        flags |= 16;
+        flags |= STB_MESSAGE_AVAILABLE;
     }
     std::int32_t trigger = 0;
     getParent()->callChecked(&CIPmxCommands::getTriggerState, *this, &trigger);
-    if (trigger == 2 || trigger == 3) {
-        flags |= 128;
+    if (trigger == PMX_TRIGGER_WAITING || trigger == PMX_TRIGGER_MEASURING) {
+        flags |= STB_OPERATION;
     }
     *status = flags;
 }

@@ -34,6 +34,11 @@ namespace LbPmxVisa {
 class CPmxSessionDispatcher;
 class CIPmxSessionState;
 
+// Bits of the emulated IEEE 488.2 status byte.
+const std::uint8_t STB_ERROR_QUEUE = 4;        // bit 2: the error queue holds an entry
+const std::uint8_t STB_MESSAGE_AVAILABLE = 16; // bit 4: an answer waits to be read
+const std::uint8_t STB_OPERATION = 128;        // bit 7: the sensor waits for its trigger or measures
+
 class CPmxSession : public LbCore::CParent<CPmxSessionDispatcher>,
                     public CIPmxEventListener,
                     public LbCore::CISerializer<LbCore::CLogMessage&, void>,

@@ -205,8 +205,10 @@ class CIPmxSessionState::CPmxOpStatusRegDataAvailable_ToNoData : public CIPmxSes
 public:
     void serialize(CPmxDataBuffer& buffer) const override
     {
-        // The emulated operation-status condition: bit 4 while the trigger state is 3, bit 5
-        // while it is 2.
+        // The emulated operation-status condition: bit 4 while the sensor measures, bit 5 while
+        // it waits for its trigger.
+        static const std::uint8_t OPER_MEASURING = 16;
+        static const std::uint8_t OPER_WAITING_FOR_TRIGGER = 32;
         class CPmxOperationStatusRegisterSerializer : public LbCore::CISerializer<CPmxDataBuffer&, void> {
         public:
             void serialize(CPmxDataBuffer& target) const override
@@ -215,11 +217,11 @@ public:
                 std::int32_t triggerState = 0;
                 CPmxSession* session = target.getParent();
                 session->getParent()->callChecked(&CIPmxCommands::getTriggerState, *session, &triggerState);
-                if (triggerState == 3) {
-                    flags |= 16;
+                if (triggerState == PMX_TRIGGER_MEASURING) {
+                    flags |= OPER_MEASURING;
                 }
-                if (triggerState == 2) {
-                    flags |= 32;
+                if (triggerState == PMX_TRIGGER_WAITING) {
+                    flags |= OPER_WAITING_FOR_TRIGGER;
                 }
                 target.write(std::to_string(static_cast<unsigned>(flags)));
             }
