@@ -176,7 +176,7 @@ TEST_F(PmxSimTest, MeasurementReportsStatesThenResultOnOneLibraryThreadInOrder)
 
     int32_t type = -1, count = -1, pending = -1;
     ASSERT_EQ(0, PmxGetData(handle, &type, &count, &pending));
-    EXPECT_EQ(6, type);
+    EXPECT_EQ(PMXSIM_TYPE_FLOAT, type);
     EXPECT_EQ(1, count);
     EXPECT_EQ(1, pending);
     float dbm = 0, second = 1, third = 1;
@@ -247,7 +247,7 @@ TEST_F(PmxSimTest, TraceFunctionAndContinuousMeasurement)
 
     int32_t type = -1, count = -1, pending = -1;
     ASSERT_EQ(0, PmxGetData(handle, &type, &count, &pending));
-    EXPECT_EQ(4, type);
+    EXPECT_EQ(PMXSIM_TYPE_FLOAT_ARRAY, type);
     EXPECT_EQ(8, count);
     EXPECT_GE(pending, 3);
     float trace[8];
@@ -267,15 +267,16 @@ TEST_F(PmxSimTest, EveryDataTypeIsDeliveredWithTheQueuedValues)
     const uint8_t bytes[] = { 0, 1, 2, 255 };
     const int32_t ints[] = { -7, 8, 1 << 30, 99 };
     const float floats[] = { 1.5f, -2.25f, 3.0f, 4.0f };
-    for (int32_t type = 0; type <= 11; ++type) {
+    for (int32_t type = PMXSIM_TYPE_BINARY; type <= PMXSIM_TYPE_LAST; ++type) {
         SCOPED_TRACE(type);
-        bool isBytes = type == 0 || type == 10;
-        bool isInts = type == 1 || type == 2 || type == 3 || type == 8 || type == 9;
+        bool isBytes = type == PMXSIM_TYPE_BINARY || type == PMXSIM_TYPE_TEXT;
+        bool isInts = (type >= PMXSIM_TYPE_BITFIELD1 && type <= PMXSIM_TYPE_BITFIELD3)
+            || type == PMXSIM_TYPE_LONG_TRIPLE || type == PMXSIM_TYPE_LONG;
         const void* values = isBytes ? static_cast<const void*>(bytes)
             : isInts                 ? static_cast<const void*>(ints)
                                      : static_cast<const void*>(floats);
-        int32_t queued = type == 10 ? 3 : 4;
-        if (type == 10)
+        int32_t queued = type == PMXSIM_TYPE_TEXT ? 3 : 4;
+        if (type == PMXSIM_TYPE_TEXT)
             values = "abc";
         ASSERT_EQ(0, PmxSimQueueResult("100000", type, values, queued));
         ASSERT_TRUE(m_aRecorder.waitFor(
@@ -286,29 +287,29 @@ TEST_F(PmxSimTest, EveryDataTypeIsDeliveredWithTheQueuedValues)
         EXPECT_EQ(type, reported);
         EXPECT_EQ(queued, count);
         EXPECT_EQ(1, pending);
-        if (type == 0) {
+        if (type == PMXSIM_TYPE_BINARY) {
             uint8_t got[8];
             int32_t n = 0;
             ASSERT_EQ(0, PmxGetBinaryResult(handle, got, sizeof got, &n));
             ASSERT_EQ(4, n);
             EXPECT_EQ(0, std::memcmp(bytes, got, 4));
-        } else if (type == 10) {
+        } else if (type == PMXSIM_TYPE_TEXT) {
             char got[8];
             ASSERT_EQ(0, PmxGetStringResult(handle, got, sizeof got));
             EXPECT_STREQ("abc", got);
-        } else if (type <= 3 || type == 8 || type == 9) {
+        } else if (isInts) {
             int32_t a = 0, b = 0, c = 0;
-            auto getter = type <= 3 ? PmxGetBitfieldResult : PmxGetLongResult;
-            auto other = type <= 3 ? PmxGetLongResult : PmxGetBitfieldResult;
+            auto getter = type <= PMXSIM_TYPE_BITFIELD3 ? PmxGetBitfieldResult : PmxGetLongResult;
+            auto other = type <= PMXSIM_TYPE_BITFIELD3 ? PmxGetLongResult : PmxGetBitfieldResult;
             EXPECT_EQ(PMXSIM_E_TYPE_MISMATCH, other(handle, &a, &b, &c));
             ASSERT_EQ(0, getter(handle, &a, &b, &c));
             EXPECT_EQ(-7, a);
             EXPECT_EQ(8, b);
             EXPECT_EQ(1 << 30, c);
-        } else if (type == 4 || type == 11) {
+        } else if (type == PMXSIM_TYPE_FLOAT_ARRAY || type == PMXSIM_TYPE_AUX_FLOAT_ARRAY) {
             float a1[4] = {}, a2[4] = { 9, 9, 9, 9 }, a3[4] = { 9, 9, 9, 9 };
             int32_t n = 0;
-            if (type == 4) {
+            if (type == PMXSIM_TYPE_FLOAT_ARRAY) {
                 EXPECT_EQ(PMXSIM_E_TYPE_MISMATCH, PmxGetAuxFloatArray(handle, a1, a2, a3, 4, &n));
                 ASSERT_EQ(0, PmxGetFloatArray(handle, a1, 4, &n));
             } else {
@@ -590,7 +591,7 @@ TEST_F(PmxSimTest, ConcurrentUseFromSeveralThreads)
             while (PmxGetData(handle, &type, nullptr, nullptr) == 0) {
                 float f[3];
                 char text[128];
-                int32_t rc = type == 6 ? PmxGetFloatResult(handle, &f[0], &f[1], &f[2])
+                int32_t rc = type == PMXSIM_TYPE_FLOAT ? PmxGetFloatResult(handle, &f[0], &f[1], &f[2])
                                        : PmxGetStringResult(handle, text, sizeof text);
                 if (rc != 0 && rc != PMX_ERR_NO_MORE_RESULTS)
                     ++failures;
@@ -603,12 +604,12 @@ TEST_F(PmxSimTest, ConcurrentUseFromSeveralThreads)
             if (PmxSimAttach("PMX-M02", "777") != 0 || PmxSimDetach("777") != 0)
                 ++failures;
             PmxSetNotifyCallbackErrorOccurred(i % 2 ? onError : nullptr, &other);
-            int32_t count = 0;
+            int32_t count = 0, flag = 0;
             char name[256], type[256], serial[256];
             if (PmxGetDeviceListLength(&count) != 0)
                 ++failures;
             for (int32_t n = 0; n < count; ++n)
-                PmxGetDeviceInfo(n, name, type, serial, &count);
+                PmxGetDeviceInfo(n, name, type, serial, &flag);
             PmxSetNotifyCallbackErrorOccurred(onError, &m_aRecorder);
         }
     };
