@@ -18,6 +18,7 @@
 #include "core/ThreadSafety.h"
 #include "pmxsim/CommandParser.h"
 #include "pmxsim/PmxSim.h"
+#include "pmxsim/SimSupport.h"
 #include "pmxsim/WorkerThread.h"
 
 #include <chrono>
@@ -120,6 +121,17 @@ private:
         std::vector<float> floats; // float values and arrays
     };
 
+    // What *RST restores: the measurement function and the settings that shape a result.
+    struct SSettings {
+        bool bTrace = false;
+        int32_t nTracePoints = kDefaultTracePoints;
+        double dFrequencyHz = kDefaultFrequencyHz;
+        bool bAveraging = false;
+        int32_t nAverageCount = 1;
+        double dOffsetDb = 0.0;
+        bool bWatt = false;
+    };
+
     struct SSensor {
         std::string strType;
         std::string strSerial;
@@ -130,8 +142,11 @@ private:
         bool bMeasuring = false;
         bool bContinuous = false;
         uint64_t nMeasurement = 0; // number of the running measurement; stale steps are dropped
-        bool bTrace = false;
-        int32_t nTracePoints = 0;
+        bool bMeasuringTrace = false; // what the running measurement gives
+        SSettings settings;
+        int32_t nEventStatus = 0; // the event status register (*ESR?)
+        int32_t nEventEnable = 0; // *ESE
+        int32_t nServiceEnable = 0; // *SRE
         int32_t nCommandCount = 0;
         std::string strLastCommand; // as sent, with its timeout argument
         int32_t nLastTimeout = 0;
@@ -210,8 +225,12 @@ private:
         REQUIRES(m_aMutex);
     void applyCommand(SSensor& sensor, const SCommand& command, Clock::time_point now)
         REQUIRES(m_aMutex);
+    void applyStatusCommand(SSensor& sensor, const SCommand& command) REQUIRES(m_aMutex);
+    void applySetting(SSensor& sensor, const SCommand& command) REQUIRES(m_aMutex);
     void addText(SSensor& sensor, const std::string& text) REQUIRES(m_aMutex);
-    void startMeasurement(SSensor& sensor, Clock::time_point now) REQUIRES(m_aMutex);
+    void startMeasurement(SSensor& sensor, bool trace, Clock::time_point now)
+        REQUIRES(m_aMutex);
+    float reading(const SSensor& sensor, double levelDbm) REQUIRES(m_aMutex);
     void finishMeasurement(SSensor& sensor, Clock::time_point now) REQUIRES(m_aMutex);
     void abortMeasurement(SSensor& sensor) REQUIRES(m_aMutex);
     void addResult(SSensor& sensor, SResult result) REQUIRES(m_aMutex);

@@ -56,8 +56,10 @@ int32_t CSimulator::openSensor(const char* descriptor, int64_t* handle)
     sensor->nTriggerState = kStateIdle;
     sensor->bMeasuring = false;
     sensor->bContinuous = false;
-    sensor->bTrace = false;
-    sensor->nTracePoints = kDefaultTracePoints;
+    sensor->settings = SSettings();
+    sensor->nEventStatus = 0;
+    sensor->nEventEnable = 0;
+    sensor->nServiceEnable = 0;
     sensor->nCommandCount = 0;
     sensor->strLastCommand.clear();
     sensor->nLastTimeout = 0;

@@ -1,17 +1,32 @@
 // The sensor model: what a sensor does with a command when it is due (an error, the acceptance,
-// then its effects), measurements (trigger states, duration, the result of a power or trace
-// measurement, continuous mode) and its queue of pending results.
+// then its effects: status, settings, measurements), measurements (trigger states, duration, the
+// value of a power or trace measurement as the settings shape it, continuous mode) and its queue
+// of pending results.
 #include "pmxsim/Simulator.h"
 
 #include "pmxsim/SimSupport.h"
 
 #include <algorithm>
+#include <cmath>
+#include <cstdio>
 
 namespace PmxSim {
 
 namespace {
     const float kPowerDbm = -20.0f; // level of a measurement and of a pulse top
     const float kFloorDbm = -60.0f; // level outside the pulse of a trace
+    const double kResponseDbPerGHz = -0.2; // level change per GHz away from 1 GHz
+    const char* const kScpiVersion = "1999.0";
+    // Bits of the event status register.
+    const int32_t kEventOperationComplete = 1;
+    const int32_t kEventCommandError = 32;
+
+    std::string number(double value)
+    {
+        char text[32];
+        std::snprintf(text, sizeof text, "%.9g", value);
+        return text;
+    }
 } // namespace
 
 float CSimulator::noise()
@@ -36,9 +51,10 @@ void CSimulator::abortMeasurement(SSensor& sensor)
     }
 }
 
-void CSimulator::startMeasurement(SSensor& sensor, Clock::time_point now)
+void CSimulator::startMeasurement(SSensor& sensor, bool trace, Clock::time_point now)
 {
     sensor.bMeasuring = true;
+    sensor.bMeasuringTrace = trace;
     ++sensor.nMeasurement;
     setState(sensor, kStateWaitingForTrigger);
     setState(sensor, kStateMeasuring);
@@ -49,23 +65,38 @@ void CSimulator::startMeasurement(SSensor& sensor, Clock::time_point now)
     schedule(now + std::chrono::milliseconds(duration), std::move(task));
 }
 
+// One value as the sensor reports it: the level at the input shifted by the frequency response
+// and the offset, with noise that averaging lowers, in the selected unit.
+float CSimulator::reading(const SSensor& sensor, double levelDbm)
+{
+    const SSettings& settings = sensor.settings;
+    double spread = noise();
+    if (settings.bAveraging)
+        spread /= std::sqrt(static_cast<double>(settings.nAverageCount));
+    double response = kResponseDbPerGHz * (settings.dFrequencyHz / 1e9 - 1.0);
+    double dbm = levelDbm + response + settings.dOffsetDb + spread;
+    return static_cast<float>(settings.bWatt ? std::pow(10.0, (dbm - 30.0) / 10.0) : dbm);
+}
+
 void CSimulator::finishMeasurement(SSensor& sensor, Clock::time_point now)
 {
     SResult result;
-    if (sensor.bTrace) {
+    if (sensor.bMeasuringTrace) {
         result.nType = PMXSIM_TYPE_FLOAT_ARRAY;
         // A pulse: high in the middle half of the trace.
-        for (int32_t i = 0; i < sensor.nTracePoints; ++i) {
-            bool high = i >= sensor.nTracePoints / 4 && i < sensor.nTracePoints * 3 / 4;
-            result.floats.push_back((high ? kPowerDbm : kFloorDbm) + noise());
+        int32_t points = sensor.settings.nTracePoints;
+        result.floats.reserve(static_cast<size_t>(points));
+        for (int32_t i = 0; i < points; ++i) {
+            bool high = i >= points / 4 && i < points * 3 / 4;
+            result.floats.push_back(reading(sensor, high ? kPowerDbm : kFloorDbm));
         }
     } else {
         result.nType = PMXSIM_TYPE_FLOAT;
-        result.floats.push_back(kPowerDbm + noise());
+        result.floats.push_back(reading(sensor, kPowerDbm));
     }
     addResult(sensor, std::move(result));
     if (sensor.bContinuous) {
-        startMeasurement(sensor, now);
+        startMeasurement(sensor, sensor.settings.bTrace, now);
     } else {
         sensor.bMeasuring = false;
         setState(sensor, kStateIdle);
@@ -89,12 +120,16 @@ void CSimulator::runTask(STask& task, Clock::time_point now)
 void CSimulator::runCommand(SSensor& sensor, const std::string& text, Clock::time_point now)
 {
     SCommand command = parseCommand(text);
+    bool starts = command.eAction == eMeasure || command.eAction == eRead
+        || command.eAction == eMeasurePower;
+    bool stopsContinuous = command.eAction == eContinuous && !command.bQuery && command.nValue == 0;
     // Asking for a measurement while one runs, or for the end of a continuous measurement that
     // is not running, is harmless and answered with the benign notice.
-    bool ignored = (command.eAction == eMeasure && sensor.bMeasuring)
-        || (command.eAction == eContinuousOff && !sensor.bContinuous);
-    if (command.eAction == eUnknown)
+    bool ignored = (starts && sensor.bMeasuring) || (stopsContinuous && !sensor.bContinuous);
+    if (command.eAction == eUnknown) {
+        sensor.nEventStatus |= kEventCommandError;
         post(eErrorOccurred, sensor.nHandle, PMX_ERR_UNKNOWN_COMMAND);
+    }
     if (ignored)
         post(eErrorOccurred, sensor.nHandle, PMX_INFO_COMMAND_IGNORED);
     ++sensor.nCommandCount;
@@ -112,36 +147,142 @@ void CSimulator::applyCommand(SSensor& sensor, const SCommand& command, Clock::t
         break;
     case eReset:
         abortMeasurement(sensor);
-        sensor.bTrace = false;
-        sensor.nTracePoints = kDefaultTracePoints;
+        sensor.settings = SSettings();
         sensor.results.clear();
         break;
     case eMeasure:
-        startMeasurement(sensor, now);
+    case eRead:
+        startMeasurement(sensor, sensor.settings.bTrace, now);
         break;
-    case eContinuousOn:
-        sensor.bContinuous = true;
-        if (!sensor.bMeasuring)
-            startMeasurement(sensor, now);
+    case eMeasurePower:
+        startMeasurement(sensor, false, now);
         break;
-    case eContinuousOff:
-        sensor.bContinuous = false; // the running measurement still ends with its result
+    case eContinuous:
+        if (command.bQuery) {
+            addText(sensor, sensor.bContinuous ? "1" : "0");
+        } else if (command.nValue != 0) {
+            sensor.bContinuous = true;
+            if (!sensor.bMeasuring)
+                startMeasurement(sensor, sensor.settings.bTrace, now);
+        } else {
+            sensor.bContinuous = false; // the running measurement still ends with its result
+        }
         break;
     case eAbort:
         abortMeasurement(sensor);
         break;
-    case ePower:
-    case eTrace:
-        sensor.bTrace = command.eAction == eTrace;
+    case eClearStatus:
+    case eOperationComplete:
+    case eEventStatus:
+    case eEventEnable:
+    case eServiceEnable:
+    case eSelfTest:
+    case eVersion:
+        applyStatusCommand(sensor, command);
         break;
-    case eFunctionQuery:
-        addText(sensor, sensor.bTrace ? "TRACE" : "POWER");
-        break;
+    case eFunction:
     case eTracePoints:
-        sensor.nTracePoints = command.nValue;
+    case eFrequency:
+    case eAverageCount:
+    case eAveraging:
+    case eOffset:
+    case eUnit:
+        applySetting(sensor, command);
         break;
     case eNone:
     case eUnknown:
+        break;
+    }
+}
+
+// The status commands. Commands run one after the other, so an operation is complete as soon as
+// *OPC or *OPC? is reached; a measurement still running reports its end through its result.
+void CSimulator::applyStatusCommand(SSensor& sensor, const SCommand& command)
+{
+    int32_t* enable = command.eAction == eEventEnable ? &sensor.nEventEnable
+        : command.eAction == eServiceEnable          ? &sensor.nServiceEnable
+                                                     : nullptr;
+    switch (command.eAction) {
+    case eClearStatus:
+        sensor.nEventStatus = 0;
+        break;
+    case eOperationComplete:
+        if (command.bQuery)
+            addText(sensor, "1");
+        else
+            sensor.nEventStatus |= kEventOperationComplete;
+        break;
+    case eEventStatus: // reading the register clears it
+        addText(sensor, std::to_string(sensor.nEventStatus));
+        sensor.nEventStatus = 0;
+        break;
+    case eEventEnable:
+    case eServiceEnable:
+        if (command.bQuery)
+            addText(sensor, std::to_string(*enable));
+        else
+            *enable = command.nValue;
+        break;
+    case eSelfTest:
+        addText(sensor, "0");
+        break;
+    case eVersion:
+        addText(sensor, kScpiVersion);
+        break;
+    default:
+        break;
+    }
+}
+
+// The settings: a query answers with the current value as text, a setting changes it.
+void CSimulator::applySetting(SSensor& sensor, const SCommand& command)
+{
+    SSettings& settings = sensor.settings;
+    bool query = command.bQuery;
+    switch (command.eAction) {
+    case eFunction:
+        if (query)
+            addText(sensor, settings.bTrace ? "TRACE" : "POWER");
+        else
+            settings.bTrace = command.nValue == kFunctionTrace;
+        break;
+    case eTracePoints:
+        if (query)
+            addText(sensor, std::to_string(settings.nTracePoints));
+        else
+            settings.nTracePoints = command.nValue;
+        break;
+    case eFrequency:
+        if (query)
+            addText(sensor, number(settings.dFrequencyHz));
+        else
+            settings.dFrequencyHz = command.dValue;
+        break;
+    case eAverageCount:
+        if (query)
+            addText(sensor, std::to_string(settings.nAverageCount));
+        else
+            settings.nAverageCount = command.nValue;
+        break;
+    case eAveraging:
+        if (query)
+            addText(sensor, settings.bAveraging ? "1" : "0");
+        else
+            settings.bAveraging = command.nValue != 0;
+        break;
+    case eOffset:
+        if (query)
+            addText(sensor, number(settings.dOffsetDb));
+        else
+            settings.dOffsetDb = command.dValue;
+        break;
+    case eUnit:
+        if (query)
+            addText(sensor, settings.bWatt ? "W" : "DBM");
+        else
+            settings.bWatt = command.nValue == kUnitWatt;
+        break;
+    default:
         break;
     }
 }

@@ -5,6 +5,7 @@
 
 #include <atomic>
 #include <chrono>
+#include <cmath>
 #include <condition_variable>
 #include <cstdlib>
 #include <cstring>
@@ -147,6 +148,33 @@ protected:
             [&](const SCall& c) { return c.kind == eAccepted && c.handle == handle; }, before + 1))
             << text;
     }
+    // Sends a command and waits for its next result; the oldest pending result stays for the
+    // caller to take.
+    void awaitResult(int64_t handle, const char* text)
+    {
+        size_t before = 0;
+        for (const SCall& c : m_aRecorder.calls())
+            if (c.kind == eData && c.handle == handle)
+                ++before;
+        ASSERT_EQ(0, PmxSendCommand(handle, text, 0));
+        ASSERT_TRUE(m_aRecorder.waitFor(
+            [&](const SCall& c) { return c.kind == eData && c.handle == handle; }, before + 1))
+            << text;
+    }
+    std::string ask(int64_t handle, const char* text)
+    {
+        awaitResult(handle, text);
+        char answer[256] = "";
+        EXPECT_EQ(0, PmxGetStringResult(handle, answer, sizeof answer)) << text;
+        return answer;
+    }
+    float measure(int64_t handle, const char* text = "meas?")
+    {
+        awaitResult(handle, text);
+        float value = 0.0f;
+        EXPECT_EQ(0, PmxGetFloatResult(handle, &value, nullptr, nullptr)) << text;
+        return value;
+    }
     std::string errorText(int32_t code)
     {
         char text[256] = "";
@@ -228,6 +256,73 @@ TEST_F(PmxSimTest, UnknownAndIgnoredCommandsReportErrorsBeforeTheAcknowledgement
     int32_t state = -1;
     EXPECT_EQ(0, PmxGetTriggerState(handle, &state));
     EXPECT_EQ(0, state);
+}
+
+TEST_F(PmxSimTest, PowerMeterSettingsAnswerTheirQueriesAndRefuseBadParameters)
+{
+    int64_t handle = open();
+    const char* const kAnswers[][2] = { { "freq?", "1e+09" }, { "aver?", "0" },
+        { "sens:aver:coun?", "1" }, { "corr:offs?", "0" }, { "unit:pow?", "DBM" },
+        { "func?", "POWER" }, { "trac:poin?", "100" }, { "init:cont?", "0" }, { "*ese?", "0" },
+        { "*opc?", "1" }, { "*tst?", "0" }, { "syst:vers?", "1999.0" } };
+    for (const auto& pair : kAnswers)
+        EXPECT_EQ(pair[1], ask(handle, pair[0]));
+    command(handle, "SENSe:FREQuency 2.5 GHz");
+    command(handle, ":sens:aver:stat on");
+    command(handle, "aver:coun 16");
+    command(handle, "CORR:OFFS -3.25");
+    command(handle, "unit:pow w");
+    command(handle, "*ese 36");
+    const char* const kChanged[][2] = { { "sens:freq?", "2.5e+09" }, { "aver:stat?", "1" },
+        { "aver:coun?", "16" }, { "corr:offs?", "-3.25" }, { "unit:pow?", "W" },
+        { "*ese?", "36" } };
+    for (const auto& pair : kChanged)
+        EXPECT_EQ(pair[1], ask(handle, pair[0]));
+    command(handle, "*rst");
+    EXPECT_EQ("1e+09", ask(handle, "freq?"));
+    EXPECT_EQ("36", ask(handle, "*ese?")) << "*RST keeps the status enables";
+
+    m_aRecorder.clear();
+    const char* const kBad[] = { "freq 5", "freq 1 thz", "aver:coun 0", "aver maybe",
+        "corr:offs 101", "unit:pow dbw", "*ese 256", "freq? 1", "read", "*idn", "meas:volt?",
+        "trac:poin 1025" };
+    for (const char* bad : kBad)
+        command(handle, bad);
+    size_t refused = 0;
+    for (const SCall& c : m_aRecorder.calls())
+        refused += c.kind == eError && c.value == PMX_ERR_UNKNOWN_COMMAND ? 1 : 0;
+    EXPECT_EQ(sizeof kBad / sizeof kBad[0], refused);
+    // A refused command sets the command-error bit; reading the register clears it.
+    EXPECT_EQ("32", ask(handle, "*esr?"));
+    command(handle, "*opc");
+    EXPECT_EQ("1", ask(handle, "*esr?"));
+    command(handle, "*cls");
+    EXPECT_EQ("0", ask(handle, "*esr?"));
+}
+
+TEST_F(PmxSimTest, SettingsShapeTheMeasuredValue)
+{
+    int64_t handle = open();
+    EXPECT_NEAR(-20.0f, measure(handle), 0.06f);
+    EXPECT_NEAR(-20.0f, measure(handle, "read?"), 0.06f);
+    command(handle, "corr:offs 10");
+    EXPECT_NEAR(-10.0f, measure(handle), 0.06f);
+    command(handle, "freq 11e9");
+    EXPECT_NEAR(-12.0f, measure(handle), 0.06f) << "-0.2 dB per GHz above 1 GHz";
+    command(handle, "unit:pow w");
+    EXPECT_NEAR(1e-4 * std::pow(10.0, -0.2), measure(handle), 1e-6);
+    command(handle, "*rst");
+    command(handle, "aver:coun 1024");
+    command(handle, "aver on");
+    for (int i = 0; i < 5; ++i)
+        EXPECT_NEAR(-20.0f, measure(handle), 0.002f) << "averaging lowers the noise";
+    // MEAS? measures power also when the function is the trace; READ? follows the function.
+    command(handle, "func trace");
+    EXPECT_NEAR(-20.0f, measure(handle, "meas:pow?"), 0.01f);
+    awaitResult(handle, "read?");
+    int32_t type = -1;
+    ASSERT_EQ(0, PmxGetData(handle, &type, nullptr, nullptr));
+    EXPECT_EQ(PMXSIM_TYPE_FLOAT_ARRAY, type);
 }
 
 TEST_F(PmxSimTest, TraceFunctionAndContinuousMeasurement)
