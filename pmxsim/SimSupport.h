@@ -30,6 +30,8 @@ const int32_t kStateIdle = 0;
 const int32_t kStateWaitingForTrigger = 2;
 const int32_t kStateMeasuring = 3;
 
+const int kFunctionCount = 24; // library functions (EFunction)
+
 // The model code of a type of the model table; false for other types.
 bool findModel(const std::string& type, uint32_t* code);
 // The text of a result code, or null for a code without one.

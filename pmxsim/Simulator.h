@@ -18,6 +18,7 @@
 #include "core/ThreadSafety.h"
 #include "pmxsim/CommandParser.h"
 #include "pmxsim/PmxSim.h"
+#include "pmxsim/Scenario.h"
 #include "pmxsim/SimSupport.h"
 #include "pmxsim/WorkerThread.h"
 
@@ -62,6 +63,7 @@ enum EFunction {
     eSetStateChanged,
     eFunctionCount
 };
+static_assert(eFunctionCount == kFunctionCount, "one name per library function");
 
 enum ECallback {
     eCommandAccepted,
@@ -152,6 +154,11 @@ private:
         int32_t nLastTimeout = 0;
         Clock::time_point tLastCommand;
         std::deque<SResult> results;
+        // The sensor's model from the scenario, and where its measurements stand.
+        std::shared_ptr<const SSensorModel> pModel;
+        std::mt19937 aNoise; // seeded from the model: runs repeat
+        size_t nNextLevel = 0; // of a power sequence
+        int32_t nMeasured = 0; // measurements ended since attached
     };
     typedef std::shared_ptr<SSensor> SensorPtr;
 
@@ -230,7 +237,12 @@ private:
     void addText(SSensor& sensor, const std::string& text) REQUIRES(m_aMutex);
     void startMeasurement(SSensor& sensor, bool trace, Clock::time_point now)
         REQUIRES(m_aMutex);
-    float reading(const SSensor& sensor, double levelDbm) REQUIRES(m_aMutex);
+    float reading(const SSensor& sensor, double levelDbm, double spreadDb) REQUIRES(m_aMutex);
+    float powerReading(SSensor& sensor) REQUIRES(m_aMutex);
+    void addTrace(SSensor& sensor) REQUIRES(m_aMutex);
+    bool answerFromModel(SSensor& sensor, const std::string& text) REQUIRES(m_aMutex);
+    SensorPtr makeSensor(const SSensorModel& model) REQUIRES(m_aMutex);
+    void detachLocked(SensorPtr sensor) REQUIRES(m_aMutex); // a copy: it leaves m_aSensors
     void finishMeasurement(SSensor& sensor, Clock::time_point now) REQUIRES(m_aMutex);
     void abortMeasurement(SSensor& sensor) REQUIRES(m_aMutex);
     void addResult(SSensor& sensor, SResult result) REQUIRES(m_aMutex);
@@ -261,6 +273,8 @@ private:
     int32_t m_nMeasureMs GUARDED_BY(m_aMutex) = 0;
     bool m_bAutoAck GUARDED_BY(m_aMutex) = true;
     int32_t m_aInjected[eFunctionCount] GUARDED_BY(m_aMutex);
+    uint64_t m_aCalls[eFunctionCount] GUARDED_BY(m_aMutex); // since the scenario was loaded
+    std::vector<SFault> m_aFaults GUARDED_BY(m_aMutex); // scripted by the scenario
     std::minstd_rand m_aRandom GUARDED_BY(m_aMutex);
 };
 

@@ -1,63 +1,39 @@
 // The PmxSim* control functions (reset, attach and detach, queued results and errors, trigger
-// state, last command, delays, acknowledgements, injected failures) and the sensors configured
-// by PMXSIM_DEVICES.
+// state, last command, delays, acknowledgements, injected failures) and the configured scenario.
 #include "pmxsim/Simulator.h"
 
 #include "pmxsim/SimSupport.h"
 
 #include <algorithm>
-#include <cstdlib>
 #include <cstring>
 
 namespace PmxSim {
 
-// Sensors from PMXSIM_DEVICES ("type:serial[:flag],..."; empty or "none" = no sensor) or the
-// two defaults.
-// Malformed entries are skipped: the variable is read where no caller could be told.
+// The configured scenario (PMXSIM_CONFIG, PMXSIM_DEVICES or the two default sensors) with the
+// default acknowledgement, no injected failure and fresh call counts.
 void CSimulator::loadDefaultsLocked()
 {
+    SScenario scenario = configuredScenario();
     m_aSensors.clear();
-    m_nAckMs = kDefaultAckMs;
-    m_nMeasureMs = kDefaultMeasureMs;
+    for (const SSensorModel& model : scenario.sensors)
+        m_aSensors.push_back(makeSensor(model));
+    m_nAckMs = scenario.nAckMs;
+    m_nMeasureMs = scenario.nMeasureMs;
     m_bAutoAck = true;
     std::fill(m_aInjected, m_aInjected + eFunctionCount, 0);
+    std::fill(m_aCalls, m_aCalls + eFunctionCount, 0);
+    m_aFaults = scenario.faults;
+}
 
-    const char* configured = std::getenv("PMXSIM_DEVICES");
-    std::string list = configured != nullptr ? configured : "PMX-M01:100000,PMX-M10:100001";
-    // "none" spells the empty list where an empty variable cannot be set (Windows deletes it).
-    if (lower(trim(list)) == "none")
-        list.clear();
-    size_t start = 0;
-    while (start <= list.size()) {
-        size_t end = list.find(',', start);
-        if (end == std::string::npos)
-            end = list.size();
-        std::string entry = trim(list.substr(start, end - start));
-        start = end + 1;
-        size_t colon = entry.find(':');
-        if (colon == std::string::npos)
-            continue;
-        std::string type = trim(entry.substr(0, colon));
-        std::string serial = trim(entry.substr(colon + 1));
-        int32_t flag = 1;
-        size_t flagColon = serial.find(':');
-        if (flagColon != std::string::npos) {
-            std::string flagText = trim(serial.substr(flagColon + 1));
-            serial = trim(serial.substr(0, flagColon));
-            char* rest = nullptr;
-            long value = std::strtol(flagText.c_str(), &rest, 10);
-            if (flagText.empty() || *rest != '\0')
-                continue;
-            flag = static_cast<int32_t>(value);
-        }
-        if (!validText(type.c_str()) || !validText(serial.c_str()) || findAttached(serial.c_str()))
-            continue;
-        SensorPtr sensor = std::make_shared<SSensor>();
-        sensor->strType = type;
-        sensor->strSerial = serial;
-        sensor->nFlag = flag;
-        m_aSensors.push_back(sensor);
-    }
+CSimulator::SensorPtr CSimulator::makeSensor(const SSensorModel& model)
+{
+    SensorPtr sensor = std::make_shared<SSensor>();
+    sensor->strType = model.strType;
+    sensor->strSerial = model.strSerial;
+    sensor->nFlag = model.nFlag;
+    sensor->pModel = std::make_shared<const SSensorModel>(model);
+    sensor->aNoise.seed(model.nSeed);
+    return sensor;
 }
 
 CSimulator::SensorPtr CSimulator::findAttached(const char* serial)
@@ -110,10 +86,10 @@ int32_t CSimulator::attach(const char* type, const char* serial)
         return PMXSIM_E_INVALID_ARGUMENT;
     if (findAttached(serial))
         return PMXSIM_E_ALREADY_ATTACHED;
-    SensorPtr sensor = std::make_shared<SSensor>();
-    sensor->strType = type;
-    sensor->strSerial = serial;
-    m_aSensors.push_back(sensor);
+    SSensorModel model;
+    model.strType = type;
+    model.strSerial = serial;
+    m_aSensors.push_back(makeSensor(model));
     post(eDeviceChanged, 0, 0);
     return PMX_SUCCESS;
 }
@@ -127,15 +103,19 @@ int32_t CSimulator::detach(const char* serial)
         [&](const SensorPtr& s) { return sameSerial(s->strSerial, serial); });
     if (it == m_aSensors.end())
         return PMXSIM_E_NO_SUCH_SENSOR;
-    SensorPtr sensor = *it;
-    m_aSensors.erase(it);
-    // Its handle stays known (and fails with "detached") until it is closed.
+    detachLocked(*it);
+    return PMX_SUCCESS;
+}
+
+// Its handle stays known (and fails with "detached") until it is closed.
+void CSimulator::detachLocked(SensorPtr sensor)
+{
+    m_aSensors.erase(std::find(m_aSensors.begin(), m_aSensors.end(), sensor));
     sensor->bAttached = false;
     sensor->bMeasuring = false;
     sensor->bContinuous = false;
     sensor->results.clear();
     post(eDeviceChanged, 0, 0);
-    return PMX_SUCCESS;
 }
 
 int32_t CSimulator::setDeviceFlag(const char* serial, int32_t flag)

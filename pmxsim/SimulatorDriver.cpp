@@ -59,13 +59,23 @@ CSimulator::CCall::~CCall()
     m_rSim.m_aMutex.unlock();
 }
 
+// Counts the call; a failure injected with PmxSimFailNext comes first, then a failure the
+// scenario scripted for this call.
 bool CSimulator::takeInjected(EFunction fn, int32_t* code)
 {
-    if (m_aInjected[fn] == 0)
-        return false;
-    *code = m_aInjected[fn];
-    m_aInjected[fn] = 0;
-    return true;
+    uint64_t call = ++m_aCalls[fn];
+    if (m_aInjected[fn] != 0) {
+        *code = m_aInjected[fn];
+        m_aInjected[fn] = 0;
+        return true;
+    }
+    for (const SFault& fault : m_aFaults) {
+        if (fault.nFunction == fn && static_cast<uint64_t>(fault.nCall) == call) {
+            *code = fault.nCode;
+            return true;
+        }
+    }
+    return false;
 }
 
 // ---- driver ----

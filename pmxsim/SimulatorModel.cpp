@@ -66,35 +66,83 @@ void CSimulator::startMeasurement(SSensor& sensor, bool trace, Clock::time_point
 }
 
 // One value as the sensor reports it: the level at the input shifted by the frequency response
-// and the offset, with noise that averaging lowers, in the selected unit.
-float CSimulator::reading(const SSensor& sensor, double levelDbm)
+// and the offset, with its noise lowered by averaging, in the selected unit.
+float CSimulator::reading(const SSensor& sensor, double levelDbm, double spreadDb)
 {
     const SSettings& settings = sensor.settings;
-    double spread = noise();
     if (settings.bAveraging)
-        spread /= std::sqrt(static_cast<double>(settings.nAverageCount));
+        spreadDb /= std::sqrt(static_cast<double>(settings.nAverageCount));
     double response = kResponseDbPerGHz * (settings.dFrequencyHz / 1e9 - 1.0);
-    double dbm = levelDbm + response + settings.dOffsetDb + spread;
+    double dbm = levelDbm + response + settings.dOffsetDb + spreadDb;
     return static_cast<float>(settings.bWatt ? std::pow(10.0, (dbm - 30.0) / 10.0) : dbm);
 }
 
-void CSimulator::finishMeasurement(SSensor& sensor, Clock::time_point now)
+float CSimulator::powerReading(SSensor& sensor)
+{
+    const SPowerModel& power = sensor.pModel->power;
+    switch (power.eKind) {
+    case SPowerModel::eConstant:
+        return reading(sensor, power.dLevelDbm, 0.0);
+    case SPowerModel::eSequence:
+        return reading(sensor, power.levels[sensor.nNextLevel++ % power.levels.size()], 0.0);
+    case SPowerModel::eNoisy: {
+        std::normal_distribution<double> gauss(0.0, power.dNoiseDb);
+        return reading(sensor, power.dLevelDbm, power.dNoiseDb > 0.0 ? gauss(sensor.aNoise) : 0.0);
+    }
+    case SPowerModel::eBuiltIn:
+        break;
+    }
+    return reading(sensor, kPowerDbm, noise());
+}
+
+// The built-in pulse is high in the middle half of the trace. A pulse of the scenario is sampled
+// at the start of each point's share of its duration, its edges linear in dB.
+void CSimulator::addTrace(SSensor& sensor)
 {
     SResult result;
-    if (sensor.bMeasuringTrace) {
-        result.nType = PMXSIM_TYPE_FLOAT_ARRAY;
-        // A pulse: high in the middle half of the trace.
-        int32_t points = sensor.settings.nTracePoints;
-        result.floats.reserve(static_cast<size_t>(points));
-        for (int32_t i = 0; i < points; ++i) {
+    result.nType = PMXSIM_TYPE_FLOAT_ARRAY;
+    int32_t points = sensor.settings.nTracePoints;
+    result.floats.reserve(static_cast<size_t>(points));
+    const STraceModel& trace = sensor.pModel->trace;
+    std::normal_distribution<double> gauss(0.0, trace.dNoiseDb);
+    for (int32_t i = 0; i < points; ++i) {
+        if (trace.bBuiltIn) {
             bool high = i >= points / 4 && i < points * 3 / 4;
-            result.floats.push_back(reading(sensor, high ? kPowerDbm : kFloorDbm));
+            result.floats.push_back(reading(sensor, high ? kPowerDbm : kFloorDbm, noise()));
+            continue;
         }
-    } else {
-        result.nType = PMXSIM_TYPE_FLOAT;
-        result.floats.push_back(reading(sensor, kPowerDbm));
+        double t = trace.dDurationUs * i / points;
+        double rise = t - trace.dDelayUs;
+        double fall = t - (trace.dDelayUs + trace.dWidthUs);
+        double share = 0.0; // of the way from low to high
+        if (fall >= 0.0)
+            share = trace.dFallUs > 0.0 ? std::max(0.0, 1.0 - fall / trace.dFallUs) : 0.0;
+        else if (rise >= 0.0)
+            share = trace.dRiseUs > 0.0 ? std::min(1.0, rise / trace.dRiseUs) : 1.0;
+        double level = trace.dLowDbm + share * (trace.dHighDbm - trace.dLowDbm);
+        result.floats.push_back(
+            reading(sensor, level, trace.dNoiseDb > 0.0 ? gauss(sensor.aNoise) : 0.0));
     }
     addResult(sensor, std::move(result));
+}
+
+// A sensor told to detach after N measurements ends its next one by detaching instead of giving
+// a result, so N readings succeed.
+void CSimulator::finishMeasurement(SSensor& sensor, Clock::time_point now)
+{
+    int32_t detachAfter = sensor.pModel->nDetachAfter;
+    if (detachAfter > 0 && sensor.nMeasured++ >= detachAfter) {
+        detachLocked(m_aOpen.at(sensor.nHandle));
+        return;
+    }
+    if (sensor.bMeasuringTrace) {
+        addTrace(sensor);
+    } else {
+        SResult result;
+        result.nType = PMXSIM_TYPE_FLOAT;
+        result.floats.push_back(powerReading(sensor));
+        addResult(sensor, std::move(result));
+    }
     if (sensor.bContinuous) {
         startMeasurement(sensor, sensor.settings.bTrace, now);
     } else {
@@ -119,6 +167,8 @@ void CSimulator::runTask(STask& task, Clock::time_point now)
 // switched off), then its effects.
 void CSimulator::runCommand(SSensor& sensor, const std::string& text, Clock::time_point now)
 {
+    if (answerFromModel(sensor, text))
+        return;
     SCommand command = parseCommand(text);
     bool starts = command.eAction == eMeasure || command.eAction == eRead
         || command.eAction == eMeasurePower;
@@ -285,6 +335,30 @@ void CSimulator::applySetting(SSensor& sensor, const SCommand& command)
     default:
         break;
     }
+}
+
+// Answers of the scenario come before the built-in commands: a text, or an error that is
+// reported like a refused command.
+bool CSimulator::answerFromModel(SSensor& sensor, const std::string& text)
+{
+    if (sensor.pModel->answers.empty())
+        return false;
+    std::string command = lower(trim(text.substr(0, text.find_first_of("\r\n"))));
+    for (const SAnswer& answer : sensor.pModel->answers) {
+        if (!matchesPattern(answer.strPattern.c_str(), command.c_str()))
+            continue;
+        if (answer.bError) {
+            sensor.nEventStatus |= kEventCommandError;
+            post(eErrorOccurred, sensor.nHandle, answer.nCode);
+        }
+        ++sensor.nCommandCount;
+        if (m_bAutoAck)
+            post(eCommandAccepted, sensor.nHandle, sensor.nCommandCount);
+        if (!answer.bError)
+            addText(sensor, answer.strAnswer);
+        return true;
+    }
+    return false;
 }
 
 void CSimulator::addText(SSensor& sensor, const std::string& text)
