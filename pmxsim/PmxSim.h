@@ -46,7 +46,8 @@ extern "C" {
 #endif
 
 /* Back to the state of a freshly loaded library: driver closed (its callback thread stopped),
-   callbacks removed, the configured sensors attached, default delays, auto-acknowledge on,
+   callbacks removed, sensors, delays and scripted faults from the scenario file named by
+   PMXSIM_CONFIG (else the sensors of PMXSIM_DEVICES, default delays), auto-acknowledge on,
    nothing queued, no injected failure. */
 PMX_API int32_t PmxSimReset(void);
 

@@ -6,6 +6,7 @@
 #include "pmxsim/SimSupport.h"
 
 #include <algorithm>
+#include <atomic>
 #include <new>
 
 namespace PmxSim {
@@ -14,12 +15,18 @@ namespace {
     // Set on the callback thread while it runs a callback: a registration made from inside a
     // callback must not wait for that callback to return.
     thread_local bool t_bInCallback = false;
+    // The instance once made: unloading a library that was never called has nothing to stop.
+    std::atomic<CSimulator*> g_pInstance(nullptr);
 } // namespace
 
 CSimulator& CSimulator::instance()
 {
     // Deliberately never destroyed (see the header).
-    static CSimulator* simulator = new CSimulator();
+    static CSimulator* simulator = [] {
+        CSimulator* made = new CSimulator();
+        g_pInstance.store(made);
+        return made;
+    }();
     return *simulator;
 }
 
@@ -33,6 +40,8 @@ CSimulator::CSimulator()
 
 void CSimulator::shutdownAtUnload()
 {
+    if (g_pInstance.load() == nullptr)
+        return;
     CSimulator& sim = instance();
     SWorker* worker;
     {
