@@ -1,3 +1,5 @@
+// The fixed tables (functions, models, texts of result codes) and the text helpers of the
+// simulated library.
 #include "pmxsim/SimSupport.h"
 
 #include "pmxsim/PmxSim.h"
