@@ -25,12 +25,29 @@
 #define PMXSIM_E_ALREADY_ATTACHED ((int32_t)0xD000000Du)
 #define PMXSIM_E_OUT_OF_RESOURCES ((int32_t)0xD000000Eu)
 
+/* Data types of results: what PmxGetData and the data-available callback report, and what
+   PmxSimQueueResult takes. */
+#define PMXSIM_TYPE_BINARY 0 /* bytes */
+#define PMXSIM_TYPE_BITFIELD1 1 /* int32_t */
+#define PMXSIM_TYPE_BITFIELD2 2
+#define PMXSIM_TYPE_BITFIELD3 3
+#define PMXSIM_TYPE_FLOAT_ARRAY 4 /* float */
+#define PMXSIM_TYPE_FLOAT_TRIPLE 5
+#define PMXSIM_TYPE_FLOAT 6
+#define PMXSIM_TYPE_FLOAT_STREAM 7
+#define PMXSIM_TYPE_LONG_TRIPLE 8 /* int32_t */
+#define PMXSIM_TYPE_LONG 9
+#define PMXSIM_TYPE_TEXT 10 /* bytes, without a terminating zero */
+#define PMXSIM_TYPE_AUX_FLOAT_ARRAY 11 /* float */
+#define PMXSIM_TYPE_LAST PMXSIM_TYPE_AUX_FLOAT_ARRAY
+
 #ifdef __cplusplus
 extern "C" {
 #endif
 
 /* Back to the state of a freshly loaded library: driver closed (its callback thread stopped),
-   callbacks removed, the configured sensors attached, default delays, auto-acknowledge on,
+   callbacks removed, sensors, delays and scripted faults from the scenario file named by
+   PMXSIM_CONFIG (else the sensors of PMXSIM_DEVICES, default delays), auto-acknowledge on,
    nothing queued, no injected failure. */
 PMX_API int32_t PmxSimReset(void);
 

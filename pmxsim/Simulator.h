@@ -7,10 +7,19 @@
 //
 // The instance is never destroyed: unloading the library must not race a callback thread that the
 // application left running; shutdownAtUnload only stops that thread where the platform allows.
+//
+// The members live in four files: SimulatorDriver.cpp (driver, worker thread, callbacks, the
+// shared start of every library function), SimulatorLibrary.cpp (the other library functions),
+// SimulatorModel.cpp (what a sensor does with a command) and SimulatorControl.cpp (the PmxSim*
+// control functions and the configured sensors).
 #ifndef PMXSIM_SIMULATOR_H
 #define PMXSIM_SIMULATOR_H
 
+#include "core/ThreadSafety.h"
+#include "pmxsim/CommandParser.h"
 #include "pmxsim/PmxSim.h"
+#include "pmxsim/Scenario.h"
+#include "pmxsim/SimSupport.h"
 #include "pmxsim/WorkerThread.h"
 
 #include <chrono>
@@ -19,7 +28,6 @@
 #include <deque>
 #include <map>
 #include <memory>
-#include <mutex>
 #include <random>
 #include <string>
 #include <utility>
@@ -55,6 +63,7 @@ enum EFunction {
     eSetStateChanged,
     eFunctionCount
 };
+static_assert(eFunctionCount == kFunctionCount, "one name per library function");
 
 enum ECallback {
     eCommandAccepted,
@@ -98,7 +107,7 @@ public:
     int32_t queueResult(const char* serial, int32_t dataType, const void* values, int32_t count);
     int32_t reportError(const char* serial, int32_t code);
     int32_t setTriggerState(const char* serial, int32_t state);
-  int32_t getLastCommand(const char* serial, char* text, int32_t size, int32_t* timeout);
+    int32_t getLastCommand(const char* serial, char* text, int32_t size, int32_t* timeout);
     int32_t setDelays(int32_t ackMs, int32_t measureMs);
     int32_t setAutoAck(int32_t on);
     int32_t failNext(const char* function, int32_t code);
@@ -106,11 +115,23 @@ public:
 private:
     typedef std::chrono::steady_clock Clock;
 
+    // Sensor records are reached only through the simulator's fields, so m_aMutex guards them too.
     struct SResult {
         int32_t nType = 0;
-        std::vector<uint8_t> bytes; // types 0 and 10
-        std::vector<int32_t> ints; // types 1, 2, 3, 8, 9
-        std::vector<float> floats; // types 4, 5, 6, 7, 11
+        std::vector<uint8_t> bytes; // binary block and text
+        std::vector<int32_t> ints; // bit fields and longs
+        std::vector<float> floats; // float values and arrays
+    };
+
+    // What *RST restores: the measurement function and the settings that shape a result.
+    struct SSettings {
+        bool bTrace = false;
+        int32_t nTracePoints = kDefaultTracePoints;
+        double dFrequencyHz = kDefaultFrequencyHz;
+        bool bAveraging = false;
+        int32_t nAverageCount = 1;
+        double dOffsetDb = 0.0;
+        bool bWatt = false;
     };
 
     struct SSensor {
@@ -123,13 +144,21 @@ private:
         bool bMeasuring = false;
         bool bContinuous = false;
         uint64_t nMeasurement = 0; // number of the running measurement; stale steps are dropped
-        bool bTrace = false;
-        int32_t nTracePoints = 0;
+        bool bMeasuringTrace = false; // what the running measurement gives
+        SSettings settings;
+        int32_t nEventStatus = 0; // the event status register (*ESR?)
+        int32_t nEventEnable = 0; // *ESE
+        int32_t nServiceEnable = 0; // *SRE
         int32_t nCommandCount = 0;
-    std::string strLastCommand;  // as sent, with its timeout argument
-    int32_t nLastTimeout = 0;
+        std::string strLastCommand; // as sent, with its timeout argument
+        int32_t nLastTimeout = 0;
         Clock::time_point tLastCommand;
         std::deque<SResult> results;
+        // The sensor's model from the scenario, and where its measurements stand.
+        std::shared_ptr<const SSensorModel> pModel;
+        std::mt19937 aNoise; // seeded from the model: runs repeat
+        size_t nNextLevel = 0; // of a power sequence
+        int32_t nMeasured = 0; // measurements ended since attached
     };
     typedef std::shared_ptr<SSensor> SensorPtr;
 
@@ -153,60 +182,100 @@ private:
         void* pvUser = nullptr;
     };
 
+    // What a library function needs before its own work: nothing but the lock, the driver open,
+    // or an open, attached sensor for its handle.
+    enum ENeed { eNeedNothing, eNeedDriver, eNeedSensor };
+
+    // The shared start of every library function: takes the lock for the scope, then fails with
+    // an injected failure, a closed driver or an unusable handle, as the function needs. code()
+    // is 0 when the function may go on; sensor() is then the handle's sensor (eNeedSensor).
+    class SCOPED_CAPABILITY CCall {
+    public:
+        CCall(CSimulator& sim, EFunction fn, ENeed need, int64_t handle = 0)
+            ACQUIRE(sim.m_aMutex);
+        ~CCall() RELEASE();
+        CCall(const CCall&) = delete;
+        CCall& operator=(const CCall&) = delete;
+        int32_t code() const { return m_nCode; }
+        SSensor& sensor() const { return *m_pSensor; }
+
+    private:
+        CSimulator& m_rSim;
+        int32_t m_nCode = 0;
+        SensorPtr m_pSensor;
+    };
+
     CSimulator();
 
     static void workerMain(void* arg);
-    void run(uint64_t generation);
+    void run(uint64_t generation) EXCLUDES(m_aMutex);
     // Stops the worker with the lock held; the worker is joined (or detached) by the caller after
     // releasing the lock, through the returned record.
-    SWorker* stopDriverLocked();
-    void finishStop(SWorker* worker);
-    void loadDefaultsLocked();
-    void waitForDeliveryLocked(std::unique_lock<std::mutex>& lock, ECallback kind);
-    void waitForAllDeliveriesLocked(std::unique_lock<std::mutex>& lock);
+    SWorker* stopDriverLocked() REQUIRES(m_aMutex);
+    void finishStop(SWorker* worker) EXCLUDES(m_aMutex);
+    void loadDefaultsLocked() REQUIRES(m_aMutex);
+    void waitForDeliveryLocked(ECallback kind) REQUIRES(m_aMutex);
+    void waitForAllDeliveriesLocked() REQUIRES(m_aMutex);
 
-    bool takeInjected(EFunction fn, int32_t* code);
-    int32_t findOpen(int64_t handle, SensorPtr* sensor);
-    SensorPtr findAttached(const char* serial);
-    SensorPtr findOpenBySerial(const char* serial, int32_t* code);
-    int32_t takeResult(int64_t handle, int32_t firstType, int32_t lastType, SensorPtr* sensor);
+    bool takeInjected(EFunction fn, int32_t* code) REQUIRES(m_aMutex);
+    int32_t findOpen(int64_t handle, SensorPtr* sensor) REQUIRES(m_aMutex);
+    SensorPtr findAttached(const char* serial) REQUIRES(m_aMutex);
+    SensorPtr findOpenBySerial(const char* serial, int32_t* code) REQUIRES(m_aMutex);
+    int32_t checkPending(const SSensor& sensor, int32_t firstType, int32_t lastType)
+        REQUIRES(m_aMutex);
 
-    void post(ECallback kind, int64_t handle, int32_t value);
-    void schedule(Clock::time_point due, STask task);
-    void setState(SSensor& sensor, int32_t state);
-    void runTask(STask& task, Clock::time_point now);
-    void runCommand(SSensor& sensor, const std::string& text, Clock::time_point now);
-    void startMeasurement(SSensor& sensor, Clock::time_point now);
-    void finishMeasurement(SSensor& sensor, Clock::time_point now);
-    void abortMeasurement(SSensor& sensor);
-    void addResult(SSensor& sensor, SResult result);
-    float noise();
+    void post(ECallback kind, int64_t handle, int32_t value) REQUIRES(m_aMutex);
+    void schedule(Clock::time_point due, STask task) REQUIRES(m_aMutex);
+    void setState(SSensor& sensor, int32_t state) REQUIRES(m_aMutex);
+    void runTask(STask& task, Clock::time_point now) REQUIRES(m_aMutex);
+    void runCommand(SSensor& sensor, const std::string& text, Clock::time_point now)
+        REQUIRES(m_aMutex);
+    void applyCommand(SSensor& sensor, const SCommand& command, Clock::time_point now)
+        REQUIRES(m_aMutex);
+    void applyStatusCommand(SSensor& sensor, const SCommand& command) REQUIRES(m_aMutex);
+    void applySetting(SSensor& sensor, const SCommand& command) REQUIRES(m_aMutex);
+    void addText(SSensor& sensor, const std::string& text) REQUIRES(m_aMutex);
+    void startMeasurement(SSensor& sensor, bool trace, Clock::time_point now)
+        REQUIRES(m_aMutex);
+    float reading(const SSensor& sensor, double levelDbm, double spreadDb) REQUIRES(m_aMutex);
+    float powerReading(SSensor& sensor) REQUIRES(m_aMutex);
+    void addTrace(SSensor& sensor) REQUIRES(m_aMutex);
+    bool answerFromModel(SSensor& sensor, const std::string& text) REQUIRES(m_aMutex);
+    SensorPtr makeSensor(const SSensorModel& model) REQUIRES(m_aMutex);
+    void detachLocked(SensorPtr sensor) REQUIRES(m_aMutex); // a copy: it leaves m_aSensors
+    void finishMeasurement(SSensor& sensor, Clock::time_point now) REQUIRES(m_aMutex);
+    void abortMeasurement(SSensor& sensor) REQUIRES(m_aMutex);
+    void addResult(SSensor& sensor, SResult result) REQUIRES(m_aMutex);
+    float noise() REQUIRES(m_aMutex);
 
-    std::mutex m_aMutex;
-    std::condition_variable m_aWorkChanged; // wakes the worker
-    std::condition_variable m_aDeliveryChanged; // wakes registrations waiting for a delivery
+    LbCore::CMutex m_aMutex;
+    std::condition_variable_any m_aWorkChanged; // wakes the worker
+    std::condition_variable_any m_aDeliveryChanged; // wakes registrations waiting for a delivery
 
-    bool m_bDriverOpen = false;
-    SWorker* m_pWorker = nullptr;
-    uint64_t m_nGeneration = 0; // a worker runs while the generation it was started for is current
+    bool m_bDriverOpen GUARDED_BY(m_aMutex) = false;
+    SWorker* m_pWorker GUARDED_BY(m_aMutex) = nullptr;
+    // A worker runs while the generation it was started for is current.
+    uint64_t m_nGeneration GUARDED_BY(m_aMutex) = 0;
 
-    std::vector<SensorPtr> m_aSensors; // attached, in attach order
-    std::map<int64_t, SensorPtr> m_aOpen; // open handles, including detached sensors
-    int64_t m_nNextHandle;
+    std::vector<SensorPtr> m_aSensors GUARDED_BY(m_aMutex); // attached, in attach order
+    std::map<int64_t, SensorPtr> m_aOpen GUARDED_BY(m_aMutex); // open, also detached sensors
+    int64_t m_nNextHandle GUARDED_BY(m_aMutex);
 
-    std::deque<SEvent> m_aOutbox;
-    std::map<std::pair<Clock::time_point, uint64_t>, STask> m_aTasks;
-    uint64_t m_nTaskSequence = 0;
+    std::deque<SEvent> m_aOutbox GUARDED_BY(m_aMutex);
+    std::map<std::pair<Clock::time_point, uint64_t>, STask> m_aTasks GUARDED_BY(m_aMutex);
+    uint64_t m_nTaskSequence GUARDED_BY(m_aMutex) = 0;
 
-    SCallback m_aCallbacks[eCallbackCount];
-    int m_aDelivering[eCallbackCount] = {}; // callbacks running right now, per kind
-    uint64_t m_nDeliveries = 0; // callbacks that have returned
+    SCallback m_aCallbacks[eCallbackCount] GUARDED_BY(m_aMutex);
+    int m_aDelivering[eCallbackCount] GUARDED_BY(m_aMutex) = {}; // running now, per kind
+    uint64_t m_nDeliveries GUARDED_BY(m_aMutex) = 0; // callbacks that have returned
 
-    int32_t m_nAckMs = 0;
-    int32_t m_nMeasureMs = 0;
-    bool m_bAutoAck = true;
-    int32_t m_aInjected[eFunctionCount];
-    std::minstd_rand m_aRandom;
+    int32_t m_nAckMs GUARDED_BY(m_aMutex) = 0;
+    int32_t m_nMeasureMs GUARDED_BY(m_aMutex) = 0;
+    bool m_bAutoAck GUARDED_BY(m_aMutex) = true;
+    int32_t m_aInjected[eFunctionCount] GUARDED_BY(m_aMutex);
+    uint64_t m_aCalls[eFunctionCount] GUARDED_BY(m_aMutex); // since the scenario was loaded
+    std::vector<SFault> m_aFaults GUARDED_BY(m_aMutex); // scripted by the scenario
+    std::minstd_rand m_aRandom GUARDED_BY(m_aMutex);
 };
 
 } // namespace PmxSim

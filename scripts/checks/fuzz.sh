@@ -1,12 +1,12 @@
 #!/usr/bin/env bash
 # Builds the fuzz preset (clang, libFuzzer, ASan+UBSan) and runs every <name>_fuzzer target
-# for a bounded time on its seeds in fuzz/seeds/<name>/ (all targets together stay under a
-# minute). Fails on a build failure, a crash, a leak, a timeout or any sanitizer report.
+# (resource, scpi, scenario) for a bounded time on its seeds in fuzz/seeds/<name>/ (all together
+# under a minute). Fails on a build failure, a crash, a leak, a timeout or any sanitizer report.
 # LB_FUZZ_BUILD_DIR chooses another build folder; LB_FUZZ_SECONDS the time per target.
 set -uo pipefail
 cd "$(dirname "$0")/../.."
 build=${LB_FUZZ_BUILD_DIR:-build/fuzz}
-seconds=${LB_FUZZ_SECONDS:-20}
+seconds=${LB_FUZZ_SECONDS:-15}
 launcher=(); command -v ccache >/dev/null && launcher=(-DCMAKE_C_COMPILER_LAUNCHER=ccache -DCMAKE_CXX_COMPILER_LAUNCHER=ccache)
 mkdir -p "$build"
 

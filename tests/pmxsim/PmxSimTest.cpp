@@ -1,265 +1,16 @@
-// The simulated sensor-control library through its exported C interface, as a client sees it.
-#include "pmxsim/PmxSim.h"
-
-#include <gtest/gtest.h>
+// The simulated sensor-control library through its exported C interface, as a client sees it:
+// results of every type, callbacks, injected failures, detaching, opening, texts, the device
+// list, re-entrant and concurrent use.
+#include "tests/pmxsim/PmxSimFixture.h"
 
 #include <atomic>
-#include <chrono>
-#include <condition_variable>
 #include <cstdlib>
 #include <cstring>
-#include <functional>
 #include <future>
-#include <mutex>
-#include <string>
-#include <thread>
-#include <vector>
 
 namespace {
 
-const std::chrono::seconds kDeadline(20);
-
-enum EKind { eAccepted, eState, eData, eError, eDevice };
-
-struct SCall {
-    EKind kind;
-    int64_t handle;
-    int32_t value;
-    std::thread::id thread;
-    bool operator==(const SCall& other) const
-    {
-        return kind == other.kind && handle == other.handle && value == other.value;
-    }
-};
-
-std::ostream& operator<<(std::ostream& out, const SCall& call)
-{
-    return out << "{" << call.kind << "," << call.handle << "," << call.value << "}";
-}
-
-// Records every callback; tests wait on it with a deadline, never with a sleep.
-class CRecorder {
-public:
-    void add(EKind kind, int64_t handle, int32_t value)
-    {
-        std::lock_guard<std::mutex> lock(m_aMutex);
-        m_aCalls.push_back(SCall{ kind, handle, value, std::this_thread::get_id() });
-        m_aChanged.notify_all();
-        if (m_fnHook)
-            m_fnHook(kind, handle, value);
-    }
-    // Waits until at least count calls satisfy pred.
-    bool waitFor(const std::function<bool(const SCall&)>& pred, size_t count = 1)
-    {
-        std::unique_lock<std::mutex> lock(m_aMutex);
-        return m_aChanged.wait_for(lock, kDeadline, [&] {
-            size_t matching = 0;
-            for (const SCall& call : m_aCalls)
-                matching += pred(call) ? 1 : 0;
-            return matching >= count;
-        });
-    }
-    bool waitCount(size_t count)
-    {
-        std::unique_lock<std::mutex> lock(m_aMutex);
-        return m_aChanged.wait_for(lock, kDeadline, [&] { return m_aCalls.size() >= count; });
-    }
-    std::vector<SCall> calls()
-    {
-        std::lock_guard<std::mutex> lock(m_aMutex);
-        return m_aCalls;
-    }
-    void clear()
-    {
-        std::lock_guard<std::mutex> lock(m_aMutex);
-        m_aCalls.clear();
-    }
-    // Runs on the callback thread, after recording (set before the driver opens).
-    std::function<void(EKind, int64_t, int32_t)> m_fnHook;
-
-private:
-    std::mutex m_aMutex;
-    std::condition_variable m_aChanged;
-    std::vector<SCall> m_aCalls;
-};
-
-void onAccepted(int64_t h, int32_t v, void* user)
-{
-    static_cast<CRecorder*>(user)->add(eAccepted, h, v);
-}
-void onState(int64_t h, int32_t v, void* user)
-{
-    static_cast<CRecorder*>(user)->add(eState, h, v);
-}
-void onData(int64_t h, int32_t v, void* user)
-{
-    static_cast<CRecorder*>(user)->add(eData, h, v);
-}
-void onError(int64_t h, int32_t v, void* user)
-{
-    static_cast<CRecorder*>(user)->add(eError, h, v);
-}
-void onDevice(void* user)
-{
-    static_cast<CRecorder*>(user)->add(eDevice, 0, 0);
-}
-
-void registerAll(CRecorder* recorder)
-{
-    ASSERT_EQ(0, PmxSetNotifyCallbackCommandAccepted(onAccepted, recorder));
-    ASSERT_EQ(0, PmxSetNotifyCallbackStateChanged(onState, recorder));
-    ASSERT_EQ(0, PmxSetNotifyCallbackDataAvailable(onData, recorder));
-    ASSERT_EQ(0, PmxSetNotifyCallbackErrorOccurred(onError, recorder));
-    ASSERT_EQ(0, PmxSetNotifyCallbackDeviceChanged(onDevice, recorder));
-}
-
-bool isAccepted(const SCall& c)
-{
-    return c.kind == eAccepted;
-}
-
-class PmxSimTest : public ::testing::Test {
-protected:
-    void SetUp() override
-    {
-        ASSERT_EQ(0, PmxSimReset());
-        ASSERT_EQ(0, PmxSimSetDelays(0, 0));
-        registerAll(&m_aRecorder);
-        ASSERT_EQ(0, PmxOpenDriver());
-    }
-    void TearDown() override { EXPECT_EQ(0, PmxSimReset()); }
-
-    int64_t open(const char* descriptor = "USB::0x0c6f::0003::100000")
-    {
-        int64_t handle = 0;
-        EXPECT_EQ(0, PmxOpenSensor(descriptor, &handle));
-        return handle;
-    }
-    // Sends a command and waits for its acknowledgement.
-    void command(int64_t handle, const char* text)
-    {
-        size_t before = 0;
-        for (const SCall& c : m_aRecorder.calls())
-            if (c.kind == eAccepted && c.handle == handle)
-                ++before;
-        ASSERT_EQ(0, PmxSendCommand(handle, text, 0));
-        ASSERT_TRUE(m_aRecorder.waitFor(
-            [&](const SCall& c) { return c.kind == eAccepted && c.handle == handle; }, before + 1))
-            << text;
-    }
-    std::string errorText(int32_t code)
-    {
-        char text[256] = "";
-        EXPECT_EQ(0, PmxGetErrorText(code, text, sizeof text));
-        return text;
-    }
-
-    CRecorder m_aRecorder;
-};
-
-TEST_F(PmxSimTest, MeasurementReportsStatesThenResultOnOneLibraryThreadInOrder)
-{
-    int64_t handle = open();
-    ASSERT_GT(handle, int64_t(0xFFFFFFFF)) << "handles need all 64 bits";
-    ASSERT_EQ(0, PmxSendCommand(handle, "*TRG", 0));
-    ASSERT_TRUE(
-        m_aRecorder.waitFor([&](const SCall& c) { return c.kind == eState && c.value == 0; }));
-
-    std::vector<SCall> calls = m_aRecorder.calls();
-    std::vector<SCall> expected = { { eAccepted, handle, 1, {} }, { eState, handle, 2, {} },
-        { eState, handle, 3, {} }, { eData, handle, 6, {} }, { eState, handle, 0, {} } };
-    EXPECT_EQ(expected, calls);
-    for (const SCall& call : calls) {
-        EXPECT_NE(std::this_thread::get_id(), call.thread);
-        EXPECT_EQ(calls.front().thread, call.thread);
-    }
-
-    int32_t type = -1, count = -1, pending = -1;
-    ASSERT_EQ(0, PmxGetData(handle, &type, &count, &pending));
-    EXPECT_EQ(6, type);
-    EXPECT_EQ(1, count);
-    EXPECT_EQ(1, pending);
-    float dbm = 0, second = 1, third = 1;
-    ASSERT_EQ(0, PmxGetFloatResult(handle, &dbm, &second, &third));
-    EXPECT_GT(dbm, -21.0f);
-    EXPECT_LT(dbm, -19.0f);
-    EXPECT_EQ(0.0f, second);
-    EXPECT_EQ(0.0f, third);
-    EXPECT_EQ(PMX_ERR_NO_MORE_RESULTS, PmxGetData(handle, &type, &count, &pending));
-    EXPECT_EQ(0, PmxEmptyAllBuffers(handle));
-}
-
-TEST_F(PmxSimTest, IdentificationIsATextResultAfterTheAcknowledgement)
-{
-    int64_t handle = open("usb::0X0C6F::0154::100001");
-    ASSERT_EQ(0, PmxSendCommand(handle, "*idn?\n", 0));
-    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eData; }));
-    std::vector<SCall> expected = { { eAccepted, handle, 1, {} }, { eData, handle, 10, {} } };
-    EXPECT_EQ(expected, m_aRecorder.calls());
-    char text[64];
-    EXPECT_EQ(PMXSIM_E_TYPE_MISMATCH, PmxGetFloatResult(handle, nullptr, nullptr, nullptr));
-    EXPECT_EQ(PMXSIM_E_BUFFER_TOO_SMALL, PmxGetStringResult(handle, text, 33));
-    ASSERT_EQ(0, PmxGetStringResult(handle, text, 34));
-    EXPECT_STREQ("Marlowe&Tenby,PMX-M10,100001,1.20", text);
-    EXPECT_EQ(PMX_ERR_NO_MORE_RESULTS, PmxGetStringResult(handle, text, sizeof text));
-
-    int32_t timeout = -1;
-    ASSERT_EQ(0, PmxSimGetLastCommand("100001", text, sizeof text, &timeout));
-    EXPECT_STREQ("*idn?\n", text);
-    EXPECT_EQ(0, timeout);
-    ASSERT_EQ(0, PmxSendCommand(handle, "*cls", 77));
-    ASSERT_EQ(0, PmxSimGetLastCommand("100001", text, sizeof text, &timeout));
-    EXPECT_STREQ("*cls", text);
-    EXPECT_EQ(77, timeout);
-    EXPECT_EQ(PMXSIM_E_BUFFER_TOO_SMALL, PmxSimGetLastCommand("100001", text, 4, &timeout));
-}
-
-TEST_F(PmxSimTest, UnknownAndIgnoredCommandsReportErrorsBeforeTheAcknowledgement)
-{
-    int64_t handle = open();
-    command(handle, "bogus:command");
-    command(handle, "init:cont off");
-    command(handle, "func sideways");
-    std::vector<SCall> expected
-        = { { eError, handle, PMX_ERR_UNKNOWN_COMMAND, {} }, { eAccepted, handle, 1, {} },
-              { eError, handle, PMX_INFO_COMMAND_IGNORED, {} }, { eAccepted, handle, 2, {} },
-              { eError, handle, PMX_ERR_UNKNOWN_COMMAND, {} }, { eAccepted, handle, 3, {} } };
-    EXPECT_EQ(expected, m_aRecorder.calls());
-    int32_t state = -1;
-    EXPECT_EQ(0, PmxGetTriggerState(handle, &state));
-    EXPECT_EQ(0, state);
-}
-
-TEST_F(PmxSimTest, TraceFunctionAndContinuousMeasurement)
-{
-    int64_t handle = open();
-    command(handle, ":FUNCtion \"TRACe\"");
-    command(handle, "trac:poin 8");
-    command(handle, "INITiate:CONTinuous ON");
-    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eData; }, 3));
-    // A second start while running is ignored with the benign notice.
-    command(handle, "init");
-    ASSERT_TRUE(
-        m_aRecorder.waitFor([](const SCall& c) { return c.value == PMX_INFO_COMMAND_IGNORED; }));
-    command(handle, "init:cont 0");
-    ASSERT_TRUE(m_aRecorder.waitFor(
-        [&](const SCall& c) { return c.kind == eState && c.value == 0 && c.handle == handle; }));
-
-    int32_t type = -1, count = -1, pending = -1;
-    ASSERT_EQ(0, PmxGetData(handle, &type, &count, &pending));
-    EXPECT_EQ(4, type);
-    EXPECT_EQ(8, count);
-    EXPECT_GE(pending, 3);
-    float trace[8];
-    int32_t got = 0;
-    EXPECT_EQ(PMXSIM_E_BUFFER_TOO_SMALL, PmxGetFloatArray(handle, trace, 7, &got));
-    ASSERT_EQ(0, PmxGetFloatArray(handle, trace, 8, &got));
-    ASSERT_EQ(8, got);
-    EXPECT_LT(trace[0], -50.0f);
-    EXPECT_GT(trace[4], -25.0f);
-    EXPECT_EQ(0, PmxEmptyAllBuffers(handle));
-    EXPECT_EQ(PMX_ERR_NO_MORE_RESULTS, PmxGetData(handle, &type, &count, &pending));
-}
+using namespace PmxSimTesting;
 
 TEST_F(PmxSimTest, EveryDataTypeIsDeliveredWithTheQueuedValues)
 {
@@ -267,15 +18,16 @@ TEST_F(PmxSimTest, EveryDataTypeIsDeliveredWithTheQueuedValues)
     const uint8_t bytes[] = { 0, 1, 2, 255 };
     const int32_t ints[] = { -7, 8, 1 << 30, 99 };
     const float floats[] = { 1.5f, -2.25f, 3.0f, 4.0f };
-    for (int32_t type = 0; type <= 11; ++type) {
+    for (int32_t type = PMXSIM_TYPE_BINARY; type <= PMXSIM_TYPE_LAST; ++type) {
         SCOPED_TRACE(type);
-        bool isBytes = type == 0 || type == 10;
-        bool isInts = type == 1 || type == 2 || type == 3 || type == 8 || type == 9;
+        bool isBytes = type == PMXSIM_TYPE_BINARY || type == PMXSIM_TYPE_TEXT;
+        bool isInts = (type >= PMXSIM_TYPE_BITFIELD1 && type <= PMXSIM_TYPE_BITFIELD3)
+            || type == PMXSIM_TYPE_LONG_TRIPLE || type == PMXSIM_TYPE_LONG;
         const void* values = isBytes ? static_cast<const void*>(bytes)
             : isInts                 ? static_cast<const void*>(ints)
                                      : static_cast<const void*>(floats);
-        int32_t queued = type == 10 ? 3 : 4;
-        if (type == 10)
+        int32_t queued = type == PMXSIM_TYPE_TEXT ? 3 : 4;
+        if (type == PMXSIM_TYPE_TEXT)
             values = "abc";
         ASSERT_EQ(0, PmxSimQueueResult("100000", type, values, queued));
         ASSERT_TRUE(m_aRecorder.waitFor(
@@ -286,29 +38,29 @@ TEST_F(PmxSimTest, EveryDataTypeIsDeliveredWithTheQueuedValues)
         EXPECT_EQ(type, reported);
         EXPECT_EQ(queued, count);
         EXPECT_EQ(1, pending);
-        if (type == 0) {
+        if (type == PMXSIM_TYPE_BINARY) {
             uint8_t got[8];
             int32_t n = 0;
             ASSERT_EQ(0, PmxGetBinaryResult(handle, got, sizeof got, &n));
             ASSERT_EQ(4, n);
             EXPECT_EQ(0, std::memcmp(bytes, got, 4));
-        } else if (type == 10) {
+        } else if (type == PMXSIM_TYPE_TEXT) {
             char got[8];
             ASSERT_EQ(0, PmxGetStringResult(handle, got, sizeof got));
             EXPECT_STREQ("abc", got);
-        } else if (type <= 3 || type == 8 || type == 9) {
+        } else if (isInts) {
             int32_t a = 0, b = 0, c = 0;
-            auto getter = type <= 3 ? PmxGetBitfieldResult : PmxGetLongResult;
-            auto other = type <= 3 ? PmxGetLongResult : PmxGetBitfieldResult;
+            auto getter = type <= PMXSIM_TYPE_BITFIELD3 ? PmxGetBitfieldResult : PmxGetLongResult;
+            auto other = type <= PMXSIM_TYPE_BITFIELD3 ? PmxGetLongResult : PmxGetBitfieldResult;
             EXPECT_EQ(PMXSIM_E_TYPE_MISMATCH, other(handle, &a, &b, &c));
             ASSERT_EQ(0, getter(handle, &a, &b, &c));
             EXPECT_EQ(-7, a);
             EXPECT_EQ(8, b);
             EXPECT_EQ(1 << 30, c);
-        } else if (type == 4 || type == 11) {
+        } else if (type == PMXSIM_TYPE_FLOAT_ARRAY || type == PMXSIM_TYPE_AUX_FLOAT_ARRAY) {
             float a1[4] = {}, a2[4] = { 9, 9, 9, 9 }, a3[4] = { 9, 9, 9, 9 };
             int32_t n = 0;
-            if (type == 4) {
+            if (type == PMXSIM_TYPE_FLOAT_ARRAY) {
                 EXPECT_EQ(PMXSIM_E_TYPE_MISMATCH, PmxGetAuxFloatArray(handle, a1, a2, a3, 4, &n));
                 ASSERT_EQ(0, PmxGetFloatArray(handle, a1, 4, &n));
             } else {
@@ -518,7 +270,11 @@ TEST_F(PmxSimTest, DeviceListComesFromTheEnvironment)
 #endif
     };
     setList(" PMX-M05:42:0 , BOGUS:7,broken,PMX:42");
+    testing::internal::CaptureStderr();
     ASSERT_EQ(0, PmxSimReset());
+    EXPECT_EQ("pmxsim: PMXSIM_DEVICES: entry \"broken\" skipped: not type:serial[:flag]\n"
+              "pmxsim: PMXSIM_DEVICES: entry \"PMX:42\" skipped: serial number already attached\n",
+        testing::internal::GetCapturedStderr());
     ASSERT_EQ(0, PmxOpenDriver());
     ASSERT_EQ(0, PmxGetDeviceListLength(&count));
     ASSERT_EQ(2, count) << "malformed and duplicate entries are skipped";
@@ -590,7 +346,7 @@ TEST_F(PmxSimTest, ConcurrentUseFromSeveralThreads)
             while (PmxGetData(handle, &type, nullptr, nullptr) == 0) {
                 float f[3];
                 char text[128];
-                int32_t rc = type == 6 ? PmxGetFloatResult(handle, &f[0], &f[1], &f[2])
+                int32_t rc = type == PMXSIM_TYPE_FLOAT ? PmxGetFloatResult(handle, &f[0], &f[1], &f[2])
                                        : PmxGetStringResult(handle, text, sizeof text);
                 if (rc != 0 && rc != PMX_ERR_NO_MORE_RESULTS)
                     ++failures;
@@ -603,12 +359,12 @@ TEST_F(PmxSimTest, ConcurrentUseFromSeveralThreads)
             if (PmxSimAttach("PMX-M02", "777") != 0 || PmxSimDetach("777") != 0)
                 ++failures;
             PmxSetNotifyCallbackErrorOccurred(i % 2 ? onError : nullptr, &other);
-            int32_t count = 0;
+            int32_t count = 0, flag = 0;
             char name[256], type[256], serial[256];
             if (PmxGetDeviceListLength(&count) != 0)
                 ++failures;
             for (int32_t n = 0; n < count; ++n)
-                PmxGetDeviceInfo(n, name, type, serial, &count);
+                PmxGetDeviceInfo(n, name, type, serial, &flag);
             PmxSetNotifyCallbackErrorOccurred(onError, &m_aRecorder);
         }
     };
