@@ -1,0 +1,124 @@
+// Attributes: the runtime answers those of resource managers, event contexts and the
+// runtime-level ones of sessions (queue length, user data, lock state, resource manager)
+// itself and routes all other session attributes to the passport. Also viStatusDesc.
+#include "visahost/RuntimeInternal.h"
+
+namespace LbVisaHost {
+
+namespace {
+
+const char g_szManufacturer[] = "LB VISA host";
+const ViUInt16 g_nManufacturerId = 0x0000;
+const ViUInt32 g_nImplVersion = 0x00100000;
+
+}  // namespace
+
+ViStatus CRuntime::runtimeAttribute(const PObject &pc, ViAttr nAttr, void *pValue, bool &bDone) {
+  LbCore::CMutexLock aGuard(g_aRuntimeMutex);
+  bDone = true;
+  switch (pc->m_eKind) {
+    case EKind::Event:
+      if (nAttr != VI_ATTR_EVENT_TYPE) return VI_ERROR_NSUP_ATTR;
+      store<ViEventType>(pValue, static_cast<const CEventContext &>(*pc).m_nEventType);
+      return VI_SUCCESS;
+    case EKind::FindList: return VI_ERROR_NSUP_ATTR;
+    case EKind::ResourceManager:
+    case EKind::Session: break;
+  }
+  const auto &cHolder = static_cast<const CAttributeHolder &>(*pc);
+  PSession pcSession = as<CSession>(pc, EKind::Session);
+  switch (nAttr) {
+    case VI_ATTR_MAX_QUEUE_LENGTH: store<ViUInt32>(pValue, cHolder.m_nMaxQueue); return VI_SUCCESS;
+    case VI_ATTR_USER_DATA_64: store<ViUInt64>(pValue, cHolder.m_nUserData); return VI_SUCCESS;
+    case VI_ATTR_USER_DATA_32:
+      store<ViUInt32>(pValue, static_cast<ViUInt32>(cHolder.m_nUserData));
+      return VI_SUCCESS;
+    case VI_ATTR_RSRC_LOCK_STATE: {
+      ViAccessMode nState = VI_NO_LOCK;
+      if (pcSession) {
+        auto it = m_mapRsrcLocks.find(upper(pcSession->m_strRsrc));
+        if (it != m_mapRsrcLocks.end()) {
+          if (it->second.m_nExclusive) nState = VI_EXCLUSIVE_LOCK;
+          else if (!it->second.m_mapShared.empty()) nState = VI_SHARED_LOCK;
+        }
+      }
+      store<ViAccessMode>(pValue, nState);
+      return VI_SUCCESS;
+    }
+    default: break;
+  }
+  if (pcSession) {
+    if (nAttr != VI_ATTR_RM_SESSION) {
+      bDone = false;
+      return VI_SUCCESS;
+    }
+    store<ViSession>(pValue, pcSession->m_nRm);
+    return VI_SUCCESS;
+  }
+  switch (nAttr) {
+    case VI_ATTR_RSRC_IMPL_VERSION: store<ViVersion>(pValue, g_nImplVersion); return VI_SUCCESS;
+    case VI_ATTR_RSRC_SPEC_VERSION: store<ViVersion>(pValue, VI_SPEC_VERSION); return VI_SUCCESS;
+    case VI_ATTR_RSRC_MANF_ID: store<ViUInt16>(pValue, g_nManufacturerId); return VI_SUCCESS;
+    case VI_ATTR_RSRC_MANF_NAME: copyText(static_cast<ViChar *>(pValue), g_szManufacturer); return VI_SUCCESS;
+    default: return VI_ERROR_NSUP_ATTR;
+  }
+}
+
+ViStatus CRuntime::getAttribute(ViObject nVi, ViAttr nAttr, void *pValue) {
+  PObject pc;
+  {
+    LbCore::CMutexLock aGuard(g_aRuntimeMutex);
+    pc = find(nVi);
+    PSession pcSession = as<CSession>(pc, EKind::Session);
+    if (!pc || (pcSession && pcSession->m_bClosing)) return VI_ERROR_INV_OBJECT;
+  }
+  if (!pValue) return VI_ERROR_INV_PARAMETER;
+  bool bDone = false;
+  ViStatus nStatus = runtimeAttribute(pc, nAttr, pValue, bDone);
+  if (bDone) return nStatus;
+  return route<FGetAttribute>(nVi, "viGetAttribute", false, nAttr, pValue);
+}
+
+ViStatus CRuntime::setAttribute(ViObject nVi, ViAttr nAttr, ViAttrState nValue) {
+  {
+    LbCore::CMutexLock aGuard(g_aRuntimeMutex);
+    PObject pc = find(nVi);
+    PSession pcSession = as<CSession>(pc, EKind::Session);
+    if (!pc || (pcSession && pcSession->m_bClosing)) return VI_ERROR_INV_OBJECT;
+    if (pc->m_eKind == EKind::Event || pc->m_eKind == EKind::FindList)
+      return nAttr == VI_ATTR_EVENT_TYPE ? VI_ERROR_ATTR_READONLY : VI_ERROR_NSUP_ATTR;
+    auto &cHolder = static_cast<CAttributeHolder &>(*pc);
+    switch (nAttr) {
+      case VI_ATTR_MAX_QUEUE_LENGTH:
+        if (nValue == 0 || nValue > 0xFFFFFFFFull) return VI_ERROR_NSUP_ATTR_STATE;
+        cHolder.m_nMaxQueue = static_cast<ViUInt32>(nValue);
+        return VI_SUCCESS;
+      case VI_ATTR_USER_DATA_64: cHolder.m_nUserData = nValue; return VI_SUCCESS;
+      case VI_ATTR_USER_DATA_32: cHolder.m_nUserData = static_cast<ViUInt32>(nValue); return VI_SUCCESS;
+      case VI_ATTR_RSRC_LOCK_STATE:
+      case VI_ATTR_RM_SESSION: return VI_ERROR_ATTR_READONLY;
+      default: break;
+    }
+    if (!pcSession) {
+      switch (nAttr) {
+        case VI_ATTR_RSRC_IMPL_VERSION:
+        case VI_ATTR_RSRC_SPEC_VERSION:
+        case VI_ATTR_RSRC_MANF_ID:
+        case VI_ATTR_RSRC_MANF_NAME: return VI_ERROR_ATTR_READONLY;
+        default: return VI_ERROR_NSUP_ATTR;
+      }
+    }
+  }
+  return route<FSetAttribute>(nVi, "viSetAttribute", true, nAttr, nValue);
+}
+
+ViStatus CRuntime::statusDesc(ViObject, ViStatus nStatus, ViChar szDesc[]) {
+  // Any handle is accepted: a description is most wanted after a session failed.
+  if (!szDesc) return VI_ERROR_USER_BUF;
+  std::string strText;
+  bool bKnown = statusText(nStatus, strText);
+  copyText(szDesc, strText);
+  return bKnown ? VI_SUCCESS : VI_WARN_UNKNOWN_STATUS;
+}
+
+}  // namespace LbVisaHost
