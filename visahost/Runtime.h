@@ -35,7 +35,8 @@ class CRuntime {
   CRuntime &operator=(const CRuntime &) = delete;
 
   // Services (see Services.h and README.md).
-  ViStatus createLock(ViConstString szName, ViSvcHandle *phLock);
+  ViStatus createLock(ViConstString szName, ViUInt32 nInitial, ViUInt32 nMaximum,
+                      ViSvcHandle *phLock);
   ViStatus acquireLock(ViSvcHandle hLock, ViUInt32 nTimeout);
   ViStatus releaseLock(ViSvcHandle hLock);
   ViStatus createTable(ViConstString szName, ViVersion nVersion, ViSvcHandle *phTable);
@@ -82,11 +83,14 @@ class CRuntime {
   ViStatus unlock(ViSession nVi);
 
  private:
+  // A counting lock of service 30: acquiring takes one count, releasing gives one back. It
+  // knows no owner and no recursion: a thread that acquires a (1, 1) lock twice waits for itself.
   struct CSvcLock {
+    CSvcLock(ViUInt32 nInitial, ViUInt32 nMaximum) : m_nCount(nInitial), m_nMaximum(nMaximum) {}
     LbCore::CMutex m_aMutex;
     std::condition_variable m_cvFree;
-    const void *m_pOwner GUARDED_BY(m_aMutex) = nullptr;  // identity of the owning thread
-    unsigned m_nDepth GUARDED_BY(m_aMutex) = 0;
+    ViUInt32 m_nCount GUARDED_BY(m_aMutex);
+    const ViUInt32 m_nMaximum;
   };
   struct SRsrcLock {
     ViSession m_nExclusive = 0;
@@ -111,8 +115,14 @@ class CRuntime {
       REQUIRES(g_aRuntimeMutex);
   ViStatus runtimeAttribute(const PObject &pcObject, ViAttr nAttr, void *pValue, bool &bDone)
       EXCLUDES(g_aRuntimeMutex);
+  static ViStatus parsedAttribute(const CSession &cSession, ViAttr nAttr, void *pValue);
   void closeEvent(ViEvent nContext) REQUIRES(g_aRuntimeMutex);
   void releaseRsrcLocks(const CSession &cSession) REQUIRES(g_aRuntimeMutex);
+  // A new session on resource szName, opened through pcTable: parses the name with the
+  // table's viParseRsrcEx, publishes the session and calls the table's viOpen. Null (with
+  // nStatus) when the open fails.
+  PSession openWith(CTable *pcTable, ViSession nRm, ViConstRsrc szName, ViAccessMode nMode,
+                    ViUInt32 nTimeout, ViStatus &nStatus) EXCLUDES(g_aRuntimeMutex);
 
   // Calls operation szOp of the vector table installed on session nVi; VI_ERROR_NSUP_OPER
   // when the table lacks it, VI_ERROR_RSRC_LOCKED when another session locked the resource.
@@ -140,6 +150,8 @@ class CRuntime {
     bool m_bQueued;  // the context also went to the session's queue and outlives the handlers
   };
   void postHandlers(const SHandlerJob &sJob) EXCLUDES(m_aHandlerMutex);
+  // Records a failed operation of session nVi and raises VI_EVENT_EXCEPTION when enabled.
+  void operationFailed(ViSession nVi, ViStatus nStatus, const char *szOp) EXCLUDES(g_aRuntimeMutex);
   void runHandlers() EXCLUDES(m_aHandlerMutex, g_aRuntimeMutex);
   LbCore::CMutex m_aHandlerMutex;
   std::condition_variable m_cvHandlerJobs;

@@ -1,6 +1,7 @@
 // Attributes: the runtime answers those of resource managers, event contexts and the
 // runtime-level ones of sessions (queue length, user data, lock state, resource manager)
-// itself and routes all other session attributes to the passport. Also viStatusDesc.
+// itself and routes all other session attributes to the passport; interface attributes the
+// passport does not answer come from its viParseRsrcEx. Also viStatusDesc.
 #include "visahost/RuntimeInternal.h"
 
 namespace LbVisaHost {
@@ -13,14 +14,40 @@ const ViUInt32 g_nImplVersion = 0x00100000;
 
 }  // namespace
 
+// Interface attributes of a session that its passport does not answer: from the same
+// viParseRsrcEx the resource manager answers with (the passport's own answers stand).
+ViStatus CRuntime::parsedAttribute(const CSession &c, ViAttr nAttr, void *pValue) {
+  const SParsedRsrc &s = c.m_sParsed;
+  if (nAttr == VI_ATTR_RSRC_SPEC_VERSION) {
+    store<ViVersion>(pValue, VI_SPEC_VERSION);
+    return VI_SUCCESS;
+  }
+  if (!s.m_bParsed) return VI_ERROR_NSUP_ATTR;
+  switch (nAttr) {
+    case VI_ATTR_INTF_TYPE: store<ViUInt16>(pValue, s.m_nIntfType); return VI_SUCCESS;
+    case VI_ATTR_INTF_NUM: store<ViUInt16>(pValue, s.m_nIntfNum); return VI_SUCCESS;
+    case VI_ATTR_RSRC_CLASS: copyText(static_cast<ViChar *>(pValue), s.m_strClass); return VI_SUCCESS;
+    case VI_ATTR_INTF_INST_NAME:
+      // The interface part of the expanded name ("USB0" of "USB0::...").
+      copyText(static_cast<ViChar *>(pValue), s.m_strExpanded.substr(0, s.m_strExpanded.find("::")));
+      return VI_SUCCESS;
+    default: return VI_ERROR_NSUP_ATTR;
+  }
+}
+
 ViStatus CRuntime::runtimeAttribute(const PObject &pc, ViAttr nAttr, void *pValue, bool &bDone) {
   LbCore::CMutexLock aGuard(g_aRuntimeMutex);
   bDone = true;
   switch (pc->m_eKind) {
-    case EKind::Event:
-      if (nAttr != VI_ATTR_EVENT_TYPE) return VI_ERROR_NSUP_ATTR;
-      store<ViEventType>(pValue, static_cast<const CEventContext &>(*pc).m_nEventType);
+    case EKind::Event: {
+      const auto &cEvent = static_cast<const CEventContext &>(*pc);
+      bool bException = cEvent.m_nEventType == VI_EVENT_EXCEPTION;
+      if (nAttr == VI_ATTR_EVENT_TYPE) store<ViEventType>(pValue, cEvent.m_nEventType);
+      else if (bException && nAttr == VI_ATTR_STATUS) store<ViStatus>(pValue, cEvent.m_nStatus);
+      else if (bException && nAttr == VI_ATTR_OPER_NAME) copyText(static_cast<ViChar *>(pValue), cEvent.m_strOperName);
+      else return VI_ERROR_NSUP_ATTR;
       return VI_SUCCESS;
+    }
     case EKind::FindList: return VI_ERROR_NSUP_ATTR;
     case EKind::ResourceManager:
     case EKind::Session: break;
@@ -36,7 +63,7 @@ ViStatus CRuntime::runtimeAttribute(const PObject &pc, ViAttr nAttr, void *pValu
     case VI_ATTR_RSRC_LOCK_STATE: {
       ViAccessMode nState = VI_NO_LOCK;
       if (pcSession) {
-        auto it = m_mapRsrcLocks.find(upper(pcSession->m_strRsrc));
+        auto it = m_mapRsrcLocks.find(pcSession->m_strLockKey);
         if (it != m_mapRsrcLocks.end()) {
           if (it->second.m_nExclusive) nState = VI_EXCLUSIVE_LOCK;
           else if (!it->second.m_mapShared.empty()) nState = VI_SHARED_LOCK;
@@ -76,7 +103,10 @@ ViStatus CRuntime::getAttribute(ViObject nVi, ViAttr nAttr, void *pValue) {
   bool bDone = false;
   ViStatus nStatus = runtimeAttribute(pc, nAttr, pValue, bDone);
   if (bDone) return nStatus;
-  return route<FGetAttribute>(nVi, "viGetAttribute", false, nAttr, pValue);
+  nStatus = route<FGetAttribute>(nVi, "viGetAttribute", false, nAttr, pValue);
+  if (nStatus != VI_ERROR_NSUP_ATTR && nStatus != VI_ERROR_NSUP_OPER) return nStatus;
+  ViStatus nOwn = parsedAttribute(static_cast<const CSession &>(*pc), nAttr, pValue);
+  return nOwn == VI_SUCCESS ? nOwn : nStatus;
 }
 
 ViStatus CRuntime::setAttribute(ViObject nVi, ViAttr nAttr, ViAttrState nValue) {
@@ -102,7 +132,6 @@ ViStatus CRuntime::setAttribute(ViObject nVi, ViAttr nAttr, ViAttrState nValue) 
     if (!pcSession) {
       switch (nAttr) {
         case VI_ATTR_RSRC_IMPL_VERSION:
-        case VI_ATTR_RSRC_SPEC_VERSION:
         case VI_ATTR_RSRC_MANF_ID:
         case VI_ATTR_RSRC_MANF_NAME: return VI_ERROR_ATTR_READONLY;
         default: return VI_ERROR_NSUP_ATTR;

@@ -1,11 +1,19 @@
-// viClose of every kind of object. Closing a session waits for the calls on it that other
-// threads have in progress, wakes its waiters, lets the passport close it, drops its resource
-// locks and its event contexts. Closing a resource manager closes what was opened through it.
+// viClose of every kind of object. Closing a session wakes its waiters, waits a while for the
+// calls on it that other threads have in progress, lets the passport close it, drops its
+// resource locks and its event contexts. Closing a resource manager closes what was opened
+// through it.
 #include "visahost/RuntimeInternal.h"
 
 #include <algorithm>
 
 namespace LbVisaHost {
+
+namespace {
+// How long viClose waits for calls in progress on other threads before it closes the session
+// in the passport anyway: a read that waits without a time limit must not hold viClose
+// forever, and the passport's viClose is what ends such a wait.
+const ViUInt32 g_nCloseWaitMs = 1000;
+}  // namespace
 
 void CRuntime::closeEvent(ViEvent nContext) {
   PEventContext pc = as<CEventContext>(find(nContext), EKind::Event);
@@ -25,7 +33,7 @@ ViStatus CRuntime::closeSession(const PSession &pc) {
     pc->m_bClosing = true;
     pc->m_cvChanged.notify_all();
     unsigned nOwn = CInCall::count(pc->m_nHandle);
-    waitUntil(pc->m_cvChanged, VI_TMO_INFINITE,
+    waitUntil(pc->m_cvChanged, g_nCloseWaitMs,
               [&]() REQUIRES(g_aRuntimeMutex) { return pc->m_nCalls <= nOwn; });
     pf = reinterpret_cast<FSessionOnly>(operation(pc->m_pcTable, "viClose"));
   }

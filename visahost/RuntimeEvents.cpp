@@ -18,7 +18,9 @@ bool validMechanism(ViUInt16 nMech, bool bForDisable) {
 }  // namespace
 
 bool CRuntime::eventTypeKnown(const CSession &cSession, ViEventType nType) const {
-  return nType == VI_EVENT_IO_COMPLETION || cSession.m_setDeclared.count(nType) > 0;
+  // Every session can report failed operations and completed asynchronous jobs.
+  return nType == VI_EVENT_IO_COMPLETION || nType == VI_EVENT_EXCEPTION ||
+         cSession.m_setDeclared.count(nType) > 0;
 }
 
 ViStatus CRuntime::createEvent(ViSession nVi, ViEventType nType, ViEvent *pnContext,
@@ -32,7 +34,18 @@ ViStatus CRuntime::createEvent(ViSession nVi, ViEventType nType, ViEvent *pnCont
     *pnMech = it == pc->m_mapEnabled.end() ? 0 : (it->second & (VI_QUEUE | VI_HNDLR));
   }
   if (*pnMech == 0) return VI_ERROR_NENABLED;
-  auto pcEvent = std::make_shared<CEventContext>(nType, nVi);
+  ViStatus nStatus = VI_SUCCESS;
+  std::string strOper;
+  if (nType == VI_EVENT_EXCEPTION) {
+    // A passport raises exceptions for failures it sees on its own; the context names the
+    // session's last failed operation, or VI_ERROR_IO without an operation when none failed.
+    LbCore::CMutexLock aGuard(g_aRuntimeMutex);
+    if (PSession pc = findSession(nVi)) {
+      nStatus = pc->m_nLastError;
+      strOper = pc->m_strLastErrorOp;
+    }
+  }
+  auto pcEvent = std::make_shared<CEventContext>(nType, nVi, nStatus, strOper);
   publish(pcEvent);
   *pnContext = pcEvent->m_nHandle;
   return VI_SUCCESS;
@@ -67,6 +80,24 @@ ViStatus CRuntime::raiseEvent(ViSession nVi, ViEvent nContext, ViUInt32 nMech) {
   }
   if (bHandlers) postHandlers(SHandlerJob{nVi, nType, nContext, bQueued});
   return nResult;
+}
+
+void CRuntime::operationFailed(ViSession nVi, ViStatus nStatus, const char *szOp) {
+  ViUInt32 nMech = 0;
+  {
+    LbCore::CMutexLock aGuard(g_aRuntimeMutex);
+    PSession pc = findSession(nVi);
+    if (!pc) return;
+    pc->m_nLastError = nStatus;
+    pc->m_strLastErrorOp = szOp;
+    auto it = pc->m_mapEnabled.find(VI_EVENT_EXCEPTION);
+    if (pc->m_bClosing || it == pc->m_mapEnabled.end()) return;
+    nMech = it->second & (VI_QUEUE | VI_HNDLR);
+  }
+  if (nMech == 0) return;
+  auto pcEvent = std::make_shared<CEventContext>(VI_EVENT_EXCEPTION, nVi, nStatus, szOp);
+  publish(pcEvent);
+  raiseEvent(nVi, pcEvent->m_nHandle, nMech);
 }
 
 void CRuntime::postHandlers(const SHandlerJob &sJob) {
@@ -132,10 +163,10 @@ ViStatus CRuntime::enableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech,
       if (!bInstalled) return VI_ERROR_HNDLR_NINSTALLED;
     }
     ViUInt16 nEnabled = pc->m_mapEnabled.count(nType) ? pc->m_mapEnabled[nType] : 0;
-    // The passport hears the first enable of a type, which starts its event source, and an
-    // enable of what is already enabled, which it answers for itself; adding a further
-    // mechanism to an enabled type is the runtime's own business.
-    bAsk = nEnabled == 0 || (nEnabled & nMech) == nMech;
+    // The passport hears only the first enable of a type, which starts its event source; an
+    // enable of what is enabled, or of a further mechanism, is the runtime's own business.
+    if ((nEnabled & nMech) == nMech) return VI_SUCCESS_EVENT_EN;
+    bAsk = nEnabled == 0;
   }
   if (bAsk) {
     ViStatus nStatus = route<FEnableEvent>(nVi, "viEnableEvent", false, nType, nMech, nContext);
@@ -160,12 +191,8 @@ ViStatus CRuntime::disableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech
     if (!pc) return VI_ERROR_INV_EVENT;
     if (nType != VI_ALL_ENABLED_EVENTS && !eventTypeKnown(*pc, nType)) return VI_ERROR_INV_EVENT;
     if (!validMechanism(nMech, true)) return VI_ERROR_INV_MECH;
-    // The passport hears the disable that ends a type, which stops its event source, and the
-    // disable of a type that is not enabled at all, which it answers for itself. A mechanism
-    // that is not enabled on an enabled type leaves the passport's source running.
-    if (nType != VI_ALL_ENABLED_EVENTS && !pc->m_mapEnabled.count(nType)) {
-      vAsk.push_back(nType);
-    }
+    // The passport hears only the disable that ends a type, which stops its event source;
+    // disabling what is not enabled answers VI_SUCCESS_EVENT_DIS without it.
     for (auto it = pc->m_mapEnabled.begin(); it != pc->m_mapEnabled.end();) {
       if (nType != VI_ALL_ENABLED_EVENTS && it->first != nType) {
         ++it;

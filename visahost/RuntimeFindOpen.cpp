@@ -81,10 +81,16 @@ ViStatus CRuntime::findRsrc(ViSession nRm, ViConstString szExpr, ViPFindList pnL
       pf = reinterpret_cast<FFindRsrc>(operation(pcTable, "viFindRsrc"));
     }
     ViFindList nList = pcList->m_nHandle;
-    tl_pcFindTable = pcTable;
-    // A passport that fails keeps what it appended; the others are still asked.
-    pf(nRm, szExpr, &nList);
-    tl_pcFindTable = nullptr;
+    // A passport that fails, even by throwing, keeps what it appended; the others are still
+    // asked, and the marker of the running find ends with the call in every case.
+    struct SFindMarker {
+      explicit SFindMarker(CTable *pc) { tl_pcFindTable = pc; }
+      ~SFindMarker() { tl_pcFindTable = nullptr; }
+    } sMarker(pcTable);
+    try {
+      pf(nRm, szExpr, &nList);
+    } catch (...) {
+    }
   }
   LbCore::CMutexLock aGuard(g_aRuntimeMutex);
   if (pcList->m_vFound.empty()) {
@@ -135,6 +141,46 @@ ViStatus CRuntime::parseRsrc(ViSession nRm, ViConstRsrc szName, ViPUInt16 pnType
   return VI_ERROR_RSRC_NFOUND;
 }
 
+PSession CRuntime::openWith(CTable *pcTable, ViSession nRm, ViConstRsrc szName,
+                            ViAccessMode nMode, ViUInt32 nTimeout, ViStatus &nStatus) {
+  FOpen pfOpen;
+  FParseRsrcEx pfParse;
+  FGetAttribute pfGet;
+  {
+    LbCore::CMutexLock aGuard(g_aRuntimeMutex);
+    pfOpen = reinterpret_cast<FOpen>(operation(pcTable, "viOpen"));
+    pfParse = reinterpret_cast<FParseRsrcEx>(operation(pcTable, "viParseRsrcEx"));
+    pfGet = reinterpret_cast<FGetAttribute>(operation(pcTable, "viGetAttribute"));
+  }
+  SParsedRsrc sParsed;
+  ViChar szClass[VI_FIND_BUFLEN] = {}, szExpanded[VI_FIND_BUFLEN] = {}, szAlias[VI_FIND_BUFLEN] = {};
+  if (pfParse && pfParse(nRm, szName, &sParsed.m_nIntfType, &sParsed.m_nIntfNum, szClass,
+                         szExpanded, szAlias) >= VI_SUCCESS) {
+    sParsed.m_bParsed = true;
+    sParsed.m_strClass = szClass;
+    sParsed.m_strExpanded = szExpanded[0] ? szExpanded : szName;
+  }
+  auto pcSession = std::make_shared<CSession>(
+      nRm, sParsed, upper(sParsed.m_bParsed ? sParsed.m_strExpanded : std::string(szName)));
+  publish(pcSession);
+  ViSession nVi = pcSession->m_nHandle;
+  nStatus = pfOpen(nRm, szName, nMode, nTimeout, &nVi);
+  if (nStatus < 0) {
+    LbCore::CMutexLock aGuard(g_aRuntimeMutex);
+    erase(pcSession->m_nHandle);
+    return PSession();
+  }
+  // The resource's own name, when the passport tells it, is the most canonical spelling.
+  ViChar szOwnName[VI_FIND_BUFLEN] = {};
+  if (pfGet && pfGet(pcSession->m_nHandle, VI_ATTR_RSRC_NAME, szOwnName) >= VI_SUCCESS &&
+      szOwnName[0]) {
+    szOwnName[VI_FIND_BUFLEN - 1] = '\0';
+    LbCore::CMutexLock aGuard(g_aRuntimeMutex);
+    pcSession->m_strLockKey = upper(szOwnName);
+  }
+  return pcSession;
+}
+
 ViStatus CRuntime::open(ViSession nRm, ViConstRsrc szName, ViAccessMode nMode, ViUInt32 nTimeout,
                         ViPSession pnVi) {
   ViStatus nCheck = checkRm(nRm);
@@ -145,20 +191,9 @@ ViStatus CRuntime::open(ViSession nRm, ViConstRsrc szName, ViAccessMode nMode, V
   if (nMode & ~static_cast<ViAccessMode>(VI_EXCLUSIVE_LOCK | VI_LOAD_CONFIG))
     return VI_ERROR_INV_ACC_MODE;
   for (CTable *pcTable : tablesWith("viOpen")) {
-    FOpen pf;
-    {
-      LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-      pf = reinterpret_cast<FOpen>(operation(pcTable, "viOpen"));
-    }
-    auto pcSession = std::make_shared<CSession>(nRm, szName);
-    publish(pcSession);
-    ViSession nVi = pcSession->m_nHandle;
-    ViStatus nStatus = pf(nRm, szName, nMode, nTimeout, &nVi);
-    if (nStatus < 0) {
-      {
-        LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-        erase(pcSession->m_nHandle);
-      }
+    ViStatus nStatus = VI_SUCCESS;
+    PSession pcSession = openWith(pcTable, nRm, szName, nMode, nTimeout, nStatus);
+    if (!pcSession) {
       if (nStatus == VI_ERROR_RSRC_NFOUND || nStatus == VI_ERROR_INV_RSRC_NAME) continue;
       return nStatus;
     }

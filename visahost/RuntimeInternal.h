@@ -99,9 +99,12 @@ ViStatus CRuntime::route(ViSession nVi, const char *szOp, bool bNeedsAccess, A..
     CInCall cMark(nVi);
     nStatus = pf(nVi, args...);
   }
-  LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-  --pc->m_nCalls;
-  pc->m_cvChanged.notify_all();
+  {
+    LbCore::CMutexLock aGuard(g_aRuntimeMutex);
+    --pc->m_nCalls;
+    pc->m_cvChanged.notify_all();
+  }
+  if (nStatus < VI_SUCCESS) operationFailed(nVi, nStatus, szOp);
   return nStatus;
 }
 

@@ -1,4 +1,5 @@
-// viLock / viUnlock: exclusive and shared locks per resource (name case ignored), and the
+// viLock / viUnlock: exclusive and shared locks per resource (keyed by the canonical resource
+// name the passport's viParseRsrcEx gives, so that every spelling shares one lock), and the
 // access check that operations changing a resource make before reaching the passport.
 #include "visahost/RuntimeInternal.h"
 
@@ -10,7 +11,7 @@ const char g_szKeyPrefix[] = "lbvisa-key-";
 }  // namespace
 
 bool CRuntime::accessAllowed(const CSession &c) const {
-  auto it = m_mapRsrcLocks.find(upper(c.m_strRsrc));
+  auto it = m_mapRsrcLocks.find(c.m_strLockKey);
   if (it == m_mapRsrcLocks.end()) return true;
   const SRsrcLock &s = it->second;
   if (s.m_nExclusive) return s.m_nExclusive == c.m_nHandle;
@@ -18,7 +19,7 @@ bool CRuntime::accessAllowed(const CSession &c) const {
 }
 
 void CRuntime::releaseRsrcLocks(const CSession &c) {
-  auto it = m_mapRsrcLocks.find(upper(c.m_strRsrc));
+  auto it = m_mapRsrcLocks.find(c.m_strLockKey);
   if (it == m_mapRsrcLocks.end()) return;
   if (it->second.m_nExclusive == c.m_nHandle) {
     it->second.m_nExclusive = 0;
@@ -38,22 +39,28 @@ ViStatus CRuntime::lock(ViSession nVi, ViAccessMode nType, ViUInt32 nTimeout,
   if (!pc) return VI_ERROR_NSUP_OPER;
   if (nType != VI_EXCLUSIVE_LOCK && nType != VI_SHARED_LOCK) return VI_ERROR_INV_LOCK_TYPE;
   if (nType == VI_SHARED_LOCK && !szAccessKey) return VI_ERROR_INV_PARAMETER;
-  std::string strKey = upper(pc->m_strRsrc);
-  SRsrcLock &s = m_mapRsrcLocks[strKey];
-  if (nType == VI_EXCLUSIVE_LOCK && s.m_nExclusive == nVi) {
-    ++s.m_nExclusiveDepth;
-    return VI_SUCCESS_NESTED_EXCLUSIVE;
+  const std::string &strKey = pc->m_strLockKey;
+  // Entries exist only while a session holds a lock: lookups here never create one.
+  auto itHeld = m_mapRsrcLocks.find(strKey);
+  if (itHeld != m_mapRsrcLocks.end()) {
+    SRsrcLock &s = itHeld->second;
+    if (nType == VI_EXCLUSIVE_LOCK && s.m_nExclusive == nVi) {
+      ++s.m_nExclusiveDepth;
+      return VI_SUCCESS_NESTED_EXCLUSIVE;
+    }
+    if (nType == VI_SHARED_LOCK && s.m_mapShared.count(nVi)) {
+      ++s.m_mapShared[nVi];
+      copyText(szAccessKey, s.m_strSharedKey);
+      return VI_SUCCESS_NESTED_SHARED;
+    }
+    if (nType == VI_SHARED_LOCK && szRequested && !s.m_strSharedKey.empty() &&
+        s.m_strSharedKey != szRequested)
+      return VI_ERROR_INV_ACCESS_KEY;
   }
-  if (nType == VI_SHARED_LOCK && s.m_mapShared.count(nVi)) {
-    ++s.m_mapShared[nVi];
-    copyText(szAccessKey, s.m_strSharedKey);
-    return VI_SUCCESS_NESTED_SHARED;
-  }
-  if (nType == VI_SHARED_LOCK && szRequested && !s.m_strSharedKey.empty() &&
-      s.m_strSharedKey != szRequested)
-    return VI_ERROR_INV_ACCESS_KEY;
   auto fFree = [&]() REQUIRES(g_aRuntimeMutex) {
-    SRsrcLock &t = m_mapRsrcLocks[strKey];
+    auto it = m_mapRsrcLocks.find(strKey);
+    if (it == m_mapRsrcLocks.end()) return true;
+    const SRsrcLock &t = it->second;
     if (t.m_nExclusive && t.m_nExclusive != nVi) return false;
     if (nType == VI_SHARED_LOCK) return t.m_strSharedKey.empty() || !szRequested || t.m_strSharedKey == szRequested;
     for (auto &sEntry : t.m_mapShared)
@@ -83,7 +90,7 @@ ViStatus CRuntime::unlock(ViSession nVi) {
   PSession pc = as<CSession>(pcObject, EKind::Session);
   if (!pcObject || (pc && pc->m_bClosing)) return VI_ERROR_INV_OBJECT;
   if (!pc) return VI_ERROR_NSUP_OPER;
-  auto it = m_mapRsrcLocks.find(upper(pc->m_strRsrc));
+  auto it = m_mapRsrcLocks.find(pc->m_strLockKey);
   if (it == m_mapRsrcLocks.end()) return VI_ERROR_SESN_NLOCKED;
   SRsrcLock &s = it->second;
   if (s.m_nExclusive == nVi) {

@@ -57,12 +57,23 @@ struct SHandler {
   ViAddr m_pUser;
 };
 
+// What the viParseRsrcEx of the passport that opens a resource says of its name.
+struct SParsedRsrc {
+  bool m_bParsed = false;
+  ViUInt16 m_nIntfType = 0;
+  ViUInt16 m_nIntfNum = 0;
+  std::string m_strClass;
+  std::string m_strExpanded;
+};
+
 struct CSession : CAttributeHolder {
-  CSession(ViSession nRm, const std::string &strRsrc)
-      : CAttributeHolder(EKind::Session), m_nRm(nRm), m_strRsrc(strRsrc) {}
+  CSession(ViSession nRm, const SParsedRsrc &sParsed, const std::string &strLockKey)
+      : CAttributeHolder(EKind::Session), m_nRm(nRm), m_sParsed(sParsed), m_strLockKey(strLockKey) {}
   ViAddr m_apRecord[RECORD_SLOTS] = {};
   const ViSession m_nRm;  // the resource manager that opened it
-  const std::string m_strRsrc;
+  const SParsedRsrc m_sParsed;
+  // The resource's canonical name in upper case, which keys its resource locks.
+  std::string m_strLockKey GUARDED_BY(g_aRuntimeMutex);
   CTable *m_pcTable GUARDED_BY(g_aRuntimeMutex) = nullptr;
   bool m_bClosing GUARDED_BY(g_aRuntimeMutex) = false;
   unsigned m_nCalls GUARDED_BY(g_aRuntimeMutex) = 0;  // calls in progress through the table
@@ -70,6 +81,9 @@ struct CSession : CAttributeHolder {
   std::map<ViEventType, ViUInt16> m_mapEnabled GUARDED_BY(g_aRuntimeMutex);
   std::deque<ViEvent> m_dqQueue GUARDED_BY(g_aRuntimeMutex);
   std::vector<SHandler> m_vHandlers GUARDED_BY(g_aRuntimeMutex);
+  // The last operation the passport failed, for exception events it raises itself.
+  ViStatus m_nLastError GUARDED_BY(g_aRuntimeMutex) = VI_ERROR_IO;
+  std::string m_strLastErrorOp GUARDED_BY(g_aRuntimeMutex);
   std::condition_variable m_cvChanged;  // queue changed, a call returned, or closing
 };
 using PSession = std::shared_ptr<CSession>;
@@ -83,10 +97,14 @@ struct CFindList : CObject {
 using PFindList = std::shared_ptr<CFindList>;
 
 struct CEventContext : CObject {
-  CEventContext(ViEventType nType, ViSession nSource)
-      : CObject(EKind::Event), m_nEventType(nType), m_nSource(nSource) {}
+  CEventContext(ViEventType nType, ViSession nSource, ViStatus nStatus, const std::string &strOper)
+      : CObject(EKind::Event), m_nEventType(nType), m_nSource(nSource), m_nStatus(nStatus),
+        m_strOperName(strOper) {}
   const ViEventType m_nEventType;
   const ViSession m_nSource;  // the session that raised it
+  // Exception events: the failure (VI_ATTR_STATUS) and the operation (VI_ATTR_OPER_NAME).
+  const ViStatus m_nStatus;
+  const std::string m_strOperName;
 };
 using PEventContext = std::shared_ptr<CEventContext>;
 

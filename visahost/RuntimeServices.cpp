@@ -10,9 +10,6 @@ namespace LbVisaHost {
 
 namespace {
 
-// Identity of the calling thread for the ownership of service locks.
-thread_local char tl_cThreadTag;
-
 bool compare(ViUInt16 nOp, ViAttrState a, ViAttrState b) {
   switch (nOp) {
     case LBVISA_OP_EQ: return a == b;
@@ -28,12 +25,13 @@ bool compare(ViUInt16 nOp, ViAttrState a, ViAttrState b) {
 
 thread_local CTable *tl_pcFindTable = nullptr;
 
-ViStatus CRuntime::createLock(ViConstString szName, ViSvcHandle *phLock) {
-  if (!szName || !phLock) return VI_ERROR_INV_PARAMETER;
+ViStatus CRuntime::createLock(ViConstString szName, ViUInt32 nInitial, ViUInt32 nMaximum,
+                              ViSvcHandle *phLock) {
+  if (!szName || !phLock || nMaximum == 0 || nInitial > nMaximum) return VI_ERROR_INV_PARAMETER;
   LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-  // Locks are named: creating a name again hands out the same lock.
+  // Locks are named: creating a name again hands out the same lock, with its first counts.
   auto &pc = m_mapLocks[szName];
-  if (!pc) pc.reset(new CSvcLock());
+  if (!pc) pc.reset(new CSvcLock(nInitial, nMaximum));
   *phLock = pc.get();
   return VI_SUCCESS;
 }
@@ -49,13 +47,8 @@ ViStatus CRuntime::acquireLock(ViSvcHandle hLock, ViUInt32 nTimeout) {
   CSvcLock *pc = findLock(hLock);
   if (!pc) return VI_ERROR_INV_OBJECT;
   LbCore::CMutexLock aGuard(pc->m_aMutex);
-  // Recursive per thread: a passport that re-enters its own locked code does not deadlock.
-  if (pc->m_pOwner == &tl_cThreadTag) {
-    ++pc->m_nDepth;
-    return VI_SUCCESS;
-  }
   std::unique_lock<std::mutex> aWait(pc->m_aMutex.native(), std::adopt_lock);
-  auto bFree = [pc]() REQUIRES(pc->m_aMutex) { return pc->m_pOwner == nullptr; };
+  auto bFree = [pc]() REQUIRES(pc->m_aMutex) { return pc->m_nCount > 0; };
   bool bAcquired = true;
   if (nTimeout == VI_TMO_INFINITE) {
     pc->m_cvFree.wait(aWait, bFree);
@@ -64,8 +57,7 @@ ViStatus CRuntime::acquireLock(ViSvcHandle hLock, ViUInt32 nTimeout) {
   }
   aWait.release();
   if (!bAcquired) return VI_ERROR_TMO;
-  pc->m_pOwner = &tl_cThreadTag;
-  pc->m_nDepth = 1;
+  --pc->m_nCount;
   return VI_SUCCESS;
 }
 
@@ -73,11 +65,10 @@ ViStatus CRuntime::releaseLock(ViSvcHandle hLock) {
   CSvcLock *pc = findLock(hLock);
   if (!pc) return VI_ERROR_INV_OBJECT;
   LbCore::CMutexLock aGuard(pc->m_aMutex);
-  if (pc->m_pOwner != &tl_cThreadTag) return VI_ERROR_SESN_NLOCKED;
-  if (--pc->m_nDepth == 0) {
-    pc->m_pOwner = nullptr;
-    pc->m_cvFree.notify_one();
-  }
+  // A release beyond the maximum has nothing to give back.
+  if (pc->m_nCount >= pc->m_nMaximum) return VI_ERROR_SESN_NLOCKED;
+  ++pc->m_nCount;
+  pc->m_cvFree.notify_one();
   return VI_SUCCESS;
 }
 
@@ -135,10 +126,10 @@ ViStatus CRuntime::matchAttributes(ViSession nRm, ViConstString szExpr, ViConstS
   if (!szExpr) return VI_ERROR_INV_EXPR;
   if (!szRsrc) return VI_ERROR_INV_PARAMETER;
   if (checkRm(nRm) != VI_SUCCESS) return VI_ERROR_INV_OBJECT;
-  FOpen pfOpen = nullptr;
+  bool bCanOpen = false;
   {
     LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-    pfOpen = reinterpret_cast<FOpen>(operation(tl_pcFindTable, "viOpen"));
+    bCanOpen = operation(tl_pcFindTable, "viOpen") != nullptr;
   }
   std::unique_ptr<CRsrcExpr> pcExpr;
   try {
@@ -149,16 +140,11 @@ ViStatus CRuntime::matchAttributes(ViSession nRm, ViConstString szExpr, ViConstS
   if (!pcExpr->hasAttributes()) return VI_SUCCESS;
   // Attributes are those of an open session: open the resource for the time of the match.
   if (!tl_pcFindTable) return VI_ERROR_INV_SETUP;
-  if (!pfOpen) return VI_ERROR_RSRC_NFOUND;
-  auto pcSession = std::make_shared<CSession>(nRm, szRsrc);
-  publish(pcSession);
+  if (!bCanOpen) return VI_ERROR_RSRC_NFOUND;
+  ViStatus nOpen = VI_SUCCESS;
+  PSession pcSession = openWith(tl_pcFindTable, nRm, szRsrc, VI_NULL, 0, nOpen);
+  if (!pcSession) return VI_ERROR_RSRC_NFOUND;
   ViSession nVi = pcSession->m_nHandle;
-  if (pfOpen(nRm, szRsrc, VI_NULL, 0, &nVi) < 0) {
-    LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-    erase(pcSession->m_nHandle);
-    return VI_ERROR_RSRC_NFOUND;
-  }
-  nVi = pcSession->m_nHandle;
   auto fCondition = [&](const SAttrCondition &sCond) {
     if (pfCallback) {
       ViStatus nStatus = pfCallback(nVi, sCond.m_nAttr, sCond.m_nOp, sCond.m_nValue,
@@ -174,7 +160,7 @@ ViStatus CRuntime::matchAttributes(ViSession nRm, ViConstString szExpr, ViConstS
     if (getAttribute(nVi, sCond.m_nAttr, &uValue) < 0) return false;
     if (sCond.m_bText) {
       uValue.m_szText[VI_FIND_BUFLEN - 1] = '\0';
-      bool bEqual = std::regex_match(std::string(uValue.m_szText), CRsrcExpr::compile(sCond.m_strText));
+      bool bEqual = CRsrcExpr::matchesRegex(sCond.m_strText, uValue.m_szText);
       return sCond.m_nOp == LBVISA_OP_EQ ? bEqual : !bEqual;
     }
     return compare(sCond.m_nOp, uValue.m_nValue, sCond.m_nValue);

@@ -108,8 +108,9 @@ extern "C" {
 
 const LbVisaHostApi *_VI_FUNC lbVisaHostApi(void) { return &g_sApi; }
 
-ViStatus _VI_FUNC viSvc30(ViConstString name, ViUInt32, ViUInt32, ViSvcHandle *lock) {
-  return LB_RUNTIME_CALL(createLock(name, lock));
+ViStatus _VI_FUNC viSvc30(ViConstString name, ViUInt32 initial, ViUInt32 maximum,
+                          ViSvcHandle *lock) {
+  return LB_RUNTIME_CALL(createLock(name, initial, maximum, lock));
 }
 ViStatus _VI_FUNC viSvc31(ViSvcHandle lock, ViUInt32 timeout, ViUInt32) {
   return LB_RUNTIME_CALL(acquireLock(lock, timeout));

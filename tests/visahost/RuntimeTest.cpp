@@ -128,6 +128,22 @@ TEST_F(Sessions, AttributesOfRuntimeAndPassport) {
   EXPECT_EQ(VI_ERROR_INV_PARAMETER, viGetAttribute(nVi, VI_ATTR_MANF_ID, nullptr));
   EXPECT_EQ(VI_ERROR_NSUP_ATTR_STATE, viSetAttribute(nVi, VI_ATTR_MAX_QUEUE_LENGTH, 0));
   EXPECT_EQ(VI_ERROR_ATTR_READONLY, viSetAttribute(nVi, VI_ATTR_RM_SESSION, 1));
+  // Interface attributes the passport does not answer agree with viParseRsrcEx.
+  ViUInt16 nType = 0, nNum = 0, nAttrType = 0, nAttrNum = 0;
+  ViChar szClass[VI_FIND_BUFLEN] = {}, szExpanded[VI_FIND_BUFLEN] = {}, szAlias[VI_FIND_BUFLEN] = {};
+  ViChar szAttrClass[VI_FIND_BUFLEN] = {}, szInst[VI_FIND_BUFLEN] = {};
+  ASSERT_EQ(VI_SUCCESS, viParseRsrcEx(m_nRm, "TEST::2::INSTR", &nType, &nNum, szClass, szExpanded, szAlias));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nVi, VI_ATTR_INTF_TYPE, &nAttrType));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nVi, VI_ATTR_INTF_NUM, &nAttrNum));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nVi, VI_ATTR_RSRC_CLASS, szAttrClass));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nVi, VI_ATTR_INTF_INST_NAME, szInst));
+  EXPECT_EQ(nType, nAttrType);
+  EXPECT_EQ(nNum, nAttrNum);
+  EXPECT_STREQ(szClass, szAttrClass);
+  EXPECT_STREQ("TEST", szInst);
+  ViVersion nSpec = 0;
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nVi, VI_ATTR_RSRC_SPEC_VERSION, &nSpec));
+  EXPECT_EQ(static_cast<ViVersion>(VI_SPEC_VERSION), nSpec);
 
   ViChar szText[256] = {};
   ViVersion nVersion = 0;
@@ -283,8 +299,8 @@ TEST_F(Locks, ExclusiveAndSharedLocksGuardTheResource) {
   EXPECT_EQ(VI_SUCCESS, write(nC, "x"));
 
   ViSession nD = VI_NULL;
-  ASSERT_EQ(VI_SUCCESS, viOpen(m_nRm, "test::1::instr", VI_EXCLUSIVE_LOCK, 0, &nD));
-  EXPECT_EQ(VI_ERROR_RSRC_LOCKED, write(nC, "x"));  // the name's case does not matter
+  ASSERT_EQ(VI_SUCCESS, viOpen(m_nRm, "test::1", VI_EXCLUSIVE_LOCK, 0, &nD));
+  EXPECT_EQ(VI_ERROR_RSRC_LOCKED, write(nC, "x"));  // one resource, however it is spelled
   EXPECT_EQ(VI_ERROR_TMO, viOpen(m_nRm, "TEST::1::INSTR", VI_EXCLUSIVE_LOCK, 10, &nA));
   EXPECT_EQ(static_cast<ViSession>(VI_NULL), nA);
 }
