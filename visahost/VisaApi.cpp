@@ -1,12 +1,9 @@
-// The VISA C API library: every operation goes to the runtime in the service library.
-#include "visahost/Services.h"
+// The VISA C API library: the operations the runtime in the service library implements.
+// VisaApiIo.cpp adds buffered and formatted I/O, VisaApiUnsupported.cpp the operations these
+// resources do not offer.
+#include "visahost/VisaApiInternal.h"
 
-namespace {
-const LbVisaHostApi &api() {
-  static const LbVisaHostApi *s_psApi = lbVisaHostApi();
-  return *s_psApi;
-}
-}  // namespace
+using LbVisaHost::api;
 
 extern "C" {
 
