@@ -1,6 +1,7 @@
 // A passport for the runtime's tests, built and loaded like the real one and registered only
 // through the service wrapper. Resources "TEST::1::INSTR" and "TEST::2::INSTR" (VI_ATTR_MANF_ID
-// is the number); reads return the last write; a write "EVENT n" raises n service requests;
+// is the number); reads return what the last write left (VI_SUCCESS_MAX_CNT while some is
+// left); a write "EVENT n" raises n service requests;
 // after a write "HANG" a read raises one service request and waits until the session closes;
 // viAssertTrigger, viClear, viTerminate and viSetAttribute are missing on purpose.
 #include <cctype>
@@ -138,11 +139,13 @@ ViStatus _VI_FUNC tpRead(ViSession vi, ViPBuf buf, ViUInt32 cnt, ViPUInt32 ret) 
     ps->m_cvChanged.notify_all();
     return VI_ERROR_ABORT;
   }
-  const std::string &str = ps->m_strData;
+  // A read takes what it reads: the rest waits for the next read (VI_SUCCESS_MAX_CNT).
+  std::string &str = ps->m_strData;
   ViUInt32 n = cnt < str.size() ? cnt : static_cast<ViUInt32>(str.size());
   std::memcpy(buf, str.data(), n);
+  str.erase(0, n);
   if (ret) *ret = n;
-  return VI_SUCCESS;
+  return str.empty() ? VI_SUCCESS : VI_SUCCESS_MAX_CNT;
 }
 
 ViStatus _VI_FUNC tpReadSTB(ViSession vi, ViPUInt16 stb) {
