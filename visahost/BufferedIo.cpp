@@ -241,6 +241,7 @@ void CSessionIo::getAttribute(ViAttr nAttr, void *pValue) {
     case VI_ATTR_RD_BUF_OPER_MODE: std::memcpy(pValue, &m_nReadMode, sizeof m_nReadMode); break;
     case VI_ATTR_WR_BUF_OPER_MODE: std::memcpy(pValue, &m_nWriteMode, sizeof m_nWriteMode); break;
     case VI_ATTR_RD_BUF_SIZE: std::memcpy(pValue, &m_nReadSize, sizeof m_nReadSize); break;
+    case VI_ATTR_FILE_APPEND_EN: std::memcpy(pValue, &m_bAppend, sizeof m_bAppend); break;
     default: std::memcpy(pValue, &m_nWriteSize, sizeof m_nWriteSize); break;
   }
 }
@@ -256,8 +257,17 @@ ViStatus CSessionIo::setAttribute(ViAttr nAttr, ViAttrState nValue) {
       if (nValue != VI_FLUSH_ON_ACCESS && nValue != VI_FLUSH_WHEN_FULL) return VI_ERROR_NSUP_ATTR_STATE;
       m_nWriteMode = static_cast<ViUInt16>(nValue);
       return VI_SUCCESS;
+    case VI_ATTR_FILE_APPEND_EN:
+      if (nValue != VI_TRUE && nValue != VI_FALSE) return VI_ERROR_NSUP_ATTR_STATE;
+      m_bAppend = static_cast<ViBoolean>(nValue);
+      return VI_SUCCESS;
     default: return VI_ERROR_ATTR_READONLY;  // the sizes: viSetBuf sets them
   }
+}
+
+bool CSessionIo::appendsToFiles() {
+  LbCore::CMutexLock aGuard(m_aMutex);
+  return m_bAppend == VI_TRUE;
 }
 
 }  // namespace LbVisaHost

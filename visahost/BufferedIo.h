@@ -18,9 +18,12 @@ namespace LbVisaHost {
 
 const ViUInt32 g_nDefaultBufferSize = 4096;
 
+// The session attributes the library keeps: those of the buffers, and whether viReadToFile
+// appends (VI_ATTR_FILE_APPEND_EN).
 inline bool isBufferAttribute(ViAttr nAttr) {
   return nAttr == VI_ATTR_RD_BUF_OPER_MODE || nAttr == VI_ATTR_WR_BUF_OPER_MODE ||
-         nAttr == VI_ATTR_RD_BUF_SIZE || nAttr == VI_ATTR_WR_BUF_SIZE;
+         nAttr == VI_ATTR_RD_BUF_SIZE || nAttr == VI_ATTR_WR_BUF_SIZE ||
+         nAttr == VI_ATTR_FILE_APPEND_EN;
 }
 
 class CSessionIo {
@@ -43,6 +46,7 @@ class CSessionIo {
   // VI_ATTR_RD_BUF_OPER_MODE and the other buffer attributes (see isBufferAttribute).
   void getAttribute(ViAttr nAttr, void *pValue) EXCLUDES(m_aMutex);
   ViStatus setAttribute(ViAttr nAttr, ViAttrState nValue) EXCLUDES(m_aMutex);
+  bool appendsToFiles() EXCLUDES(m_aMutex);
 
  private:
   class CInput;
@@ -67,6 +71,7 @@ class CSessionIo {
   ViUInt16 m_nReadMode GUARDED_BY(m_aMutex) = VI_FLUSH_DISABLE;
   bool m_bEnd GUARDED_BY(m_aMutex) = false;  // the read buffer holds the end of a message
   ViStatus m_nReadStatus GUARDED_BY(m_aMutex) = VI_SUCCESS;
+  ViBoolean m_bAppend GUARDED_BY(m_aMutex) = VI_FALSE;
 };
 
 }  // namespace LbVisaHost

@@ -6,6 +6,7 @@
 //   RuntimeAttributes.cpp  attributes the runtime answers itself, the rest routed; status texts
 //   RuntimeEvents.cpp      event enabling, queues, waiting, handlers and their thread
 //   RuntimeLocks.cpp       viLock / viUnlock on resources
+//   RuntimeAsync.cpp       asynchronous reads and writes, viTerminate
 #include "visahost/RuntimeInternal.h"
 
 #include <algorithm>
@@ -112,10 +113,6 @@ ViStatus CRuntime::clear(ViSession nVi) { return route<FSessionOnly>(nVi, "viCle
 
 ViStatus CRuntime::assertTrigger(ViSession nVi, ViUInt16 nProtocol) {
   return route<FAssertTrigger>(nVi, "viAssertTrigger", true, nProtocol);
-}
-
-ViStatus CRuntime::terminate(ViObject nVi, ViUInt16 nDegree, ViJobId nJob) {
-  return route<FTerminate>(nVi, "viTerminate", false, nDegree, nJob);
 }
 
 }  // namespace LbVisaHost

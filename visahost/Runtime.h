@@ -78,6 +78,8 @@ class CRuntime {
   ViStatus installHandler(ViSession nVi, ViEventType nType, ViHndlr pfHandler, ViAddr pUser);
   ViStatus uninstallHandler(ViSession nVi, ViEventType nType, ViHndlr pfHandler, ViAddr pUser);
   ViStatus statusDesc(ViObject nVi, ViStatus nStatus, ViChar szDesc[]);
+  ViStatus readAsync(ViSession nVi, ViPBuf pBuf, ViUInt32 nCount, ViPJobId pnJob);
+  ViStatus writeAsync(ViSession nVi, ViConstBuf pBuf, ViUInt32 nCount, ViPJobId pnJob);
   ViStatus lock(ViSession nVi, ViAccessMode nType, ViUInt32 nTimeout, ViConstKeyId szRequested,
                 ViChar szAccessKey[]);
   ViStatus unlock(ViSession nVi);
@@ -140,6 +142,7 @@ class CRuntime {
   std::map<std::string, std::unique_ptr<CSvcLock>> m_mapLocks GUARDED_BY(g_aRuntimeMutex);
   std::map<std::string, SRsrcLock> m_mapRsrcLocks GUARDED_BY(g_aRuntimeMutex);
   unsigned m_nKeys GUARDED_BY(g_aRuntimeMutex) = 0;
+  ViJobId m_nLastJob GUARDED_BY(g_aRuntimeMutex) = 0;
 
   // Event handlers run on a thread of the runtime's own, never on the passport's thread that
   // raised the event: a handler may then call any VISA operation, viClose of its session included.
@@ -150,6 +153,9 @@ class CRuntime {
     bool m_bQueued;  // the context also went to the session's queue and outlives the handlers
   };
   void postHandlers(const SHandlerJob &sJob) EXCLUDES(m_aHandlerMutex);
+  // Raises VI_EVENT_IO_COMPLETION of a finished job when the session enabled it.
+  void completeJob(ViSession nVi, const char *szOp, ViJobId nJob, ViStatus nStatus,
+                   ViUInt32 nRet, ViAddr pBuffer) EXCLUDES(g_aRuntimeMutex);
   // Records a failed operation of session nVi and raises VI_EVENT_EXCEPTION when enabled.
   void operationFailed(ViSession nVi, ViStatus nStatus, const char *szOp) EXCLUDES(g_aRuntimeMutex);
   void runHandlers() EXCLUDES(m_aHandlerMutex, g_aRuntimeMutex);

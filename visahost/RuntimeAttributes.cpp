@@ -42,9 +42,14 @@ ViStatus CRuntime::runtimeAttribute(const PObject &pc, ViAttr nAttr, void *pValu
     case EKind::Event: {
       const auto &cEvent = static_cast<const CEventContext &>(*pc);
       bool bException = cEvent.m_nEventType == VI_EVENT_EXCEPTION;
+      bool bCompletion = cEvent.m_nEventType == VI_EVENT_IO_COMPLETION;
       if (nAttr == VI_ATTR_EVENT_TYPE) store<ViEventType>(pValue, cEvent.m_nEventType);
-      else if (bException && nAttr == VI_ATTR_STATUS) store<ViStatus>(pValue, cEvent.m_nStatus);
-      else if (bException && nAttr == VI_ATTR_OPER_NAME) copyText(static_cast<ViChar *>(pValue), cEvent.m_strOperName);
+      else if ((bException || bCompletion) && nAttr == VI_ATTR_STATUS) store<ViStatus>(pValue, cEvent.m_nStatus);
+      else if ((bException || bCompletion) && nAttr == VI_ATTR_OPER_NAME) copyText(static_cast<ViChar *>(pValue), cEvent.m_strOperName);
+      else if (bCompletion && nAttr == VI_ATTR_JOB_ID) store<ViJobId>(pValue, cEvent.m_nJobId);
+      else if (bCompletion && nAttr == VI_ATTR_RET_COUNT_32) store<ViUInt32>(pValue, static_cast<ViUInt32>(cEvent.m_nRetCount));
+      else if (bCompletion && nAttr == VI_ATTR_RET_COUNT_64) store<ViUInt64>(pValue, cEvent.m_nRetCount);
+      else if (bCompletion && nAttr == VI_ATTR_BUFFER) store<ViAddr>(pValue, cEvent.m_pBuffer);
       else return VI_ERROR_NSUP_ATTR;
       return VI_SUCCESS;
     }

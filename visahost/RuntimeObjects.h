@@ -102,9 +102,13 @@ struct CEventContext : CObject {
         m_strOperName(strOper) {}
   const ViEventType m_nEventType;
   const ViSession m_nSource;  // the session that raised it
-  // Exception events: the failure (VI_ATTR_STATUS) and the operation (VI_ATTR_OPER_NAME).
+  // Exception and I/O completion events: the outcome (VI_ATTR_STATUS) and the operation
+  // (VI_ATTR_OPER_NAME); completions also name the job, the count and the buffer.
   const ViStatus m_nStatus;
   const std::string m_strOperName;
+  ViJobId m_nJobId = 0;
+  ViUInt64 m_nRetCount = 0;
+  ViAddr m_pBuffer = nullptr;
 };
 using PEventContext = std::shared_ptr<CEventContext>;
 

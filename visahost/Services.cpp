@@ -93,13 +93,20 @@ ViStatus _VI_FUNC apiLock(ViSession vi, ViAccessMode type, ViUInt32 timeout,
   return LB_RUNTIME_CALL(lock(vi, type, timeout, requested, accessKey));
 }
 ViStatus _VI_FUNC apiUnlock(ViSession vi) { return LB_RUNTIME_CALL(unlock(vi)); }
+ViStatus _VI_FUNC apiReadAsync(ViSession vi, ViPBuf buf, ViUInt32 cnt, ViPJobId job) {
+  return LB_RUNTIME_CALL(readAsync(vi, buf, cnt, job));
+}
+ViStatus _VI_FUNC apiWriteAsync(ViSession vi, ViConstBuf buf, ViUInt32 cnt, ViPJobId job) {
+  return LB_RUNTIME_CALL(writeAsync(vi, buf, cnt, job));
+}
 
 const LbVisaHostApi g_sApi = {
     apiOpenDefaultRM, apiFindRsrc,     apiFindNext,        apiParseRsrc,     apiParseRsrcEx,
     apiOpen,          apiClose,        apiRead,            apiWrite,         apiReadSTB,
     apiClear,         apiAssertTrigger, apiTerminate,      apiGetAttribute,  apiSetAttribute,
     apiEnableEvent,   apiDisableEvent, apiDiscardEvents,   apiWaitOnEvent,   apiInstallHandler,
-    apiUninstallHandler, apiStatusDesc, apiLock,           apiUnlock,
+    apiUninstallHandler, apiStatusDesc, apiLock,           apiUnlock,        apiReadAsync,
+    apiWriteAsync,
 };
 
 }  // namespace

@@ -1,6 +1,6 @@
 // Buffered and formatted I/O of the VISA C library (viPrintf, viScanf and viQueryf families,
 // viFlush, viSetBuf, viBufRead, viBufWrite) on top of the runtime's viRead / viWrite. File and
-// asynchronous I/O are not offered by this runtime and answer VI_ERROR_NSUP_OPER.
+// asynchronous I/O are in VisaApiFileIo.cpp.
 #include <cstring>
 #include <new>
 
@@ -10,7 +10,6 @@
 using LbVisaHost::CScanInput;
 using LbVisaHost::CSessionIo;
 using LbVisaHost::SArgs;
-using LbVisaHost::unsupported;
 
 namespace {
 
@@ -156,15 +155,5 @@ ViStatus _VI_FUNC viBufRead(ViSession vi, ViPBuf buf, ViUInt32 cnt, ViPUInt32 re
   return withSession(vi, [&](CSessionIo &c) { return c.bufRead(buf, cnt, retCnt); });
 }
 
-ViStatus _VI_FUNC viReadAsync(ViSession vi, ViPBuf, ViUInt32, ViPJobId) { return unsupported(vi); }
-ViStatus _VI_FUNC viWriteAsync(ViSession vi, ViConstBuf, ViUInt32, ViPJobId) {
-  return unsupported(vi);
-}
-ViStatus _VI_FUNC viReadToFile(ViSession vi, ViConstString, ViUInt32, ViPUInt32) {
-  return unsupported(vi);
-}
-ViStatus _VI_FUNC viWriteFromFile(ViSession vi, ViConstString, ViUInt32, ViPUInt32) {
-  return unsupported(vi);
-}
 
 }  // extern "C"

@@ -1,5 +1,6 @@
 // Formatted and buffered I/O of the VISA C library: the test passport answers a read with
 // what the last write left, so a session echoes what it is sent.
+#include <cstdio>
 #include <cstring>
 #include <functional>
 #include <string>
@@ -147,7 +148,51 @@ TEST_F(FormattedIo, BuffersMeetTheDevice) {
   EXPECT_EQ(VI_ERROR_NSUP_ATTR_STATE, viSetAttribute(m_nVi, VI_ATTR_WR_BUF_OPER_MODE, 99));
   EXPECT_EQ(VI_ERROR_ATTR_READONLY, viSetAttribute(m_nVi, VI_ATTR_WR_BUF_SIZE, 99));
   EXPECT_EQ(VI_ERROR_INV_OBJECT, viFlush(0xDEAD, VI_WRITE_BUF));
-  EXPECT_EQ(VI_ERROR_NSUP_OPER, viReadAsync(m_nVi, reinterpret_cast<ViPBuf>(acBuf), 1, VI_NULL));
+}
+
+TEST_F(FormattedIo, FilesAndAsynchronousJobs) {
+  const char szFile[] = "visahost_file_io.bin";
+  ViUInt32 nRet = 0;
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "abc"));
+  EXPECT_EQ(VI_SUCCESS, viReadToFile(m_nVi, szFile, 100, &nRet));
+  EXPECT_EQ(3u, nRet);
+  ASSERT_EQ(VI_SUCCESS, viSetAttribute(m_nVi, VI_ATTR_FILE_APPEND_EN, VI_TRUE));
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "de"));
+  EXPECT_EQ(VI_SUCCESS, viReadToFile(m_nVi, szFile, 100, &nRet));
+  EXPECT_EQ(VI_SUCCESS, viWriteFromFile(m_nVi, szFile, 4, &nRet));  // at most the count
+  EXPECT_EQ(4u, nRet);
+  EXPECT_EQ("abcd", readAll());
+  std::remove(szFile);
+  EXPECT_EQ(VI_ERROR_FILE_ACCESS, viWriteFromFile(m_nVi, szFile, 4, &nRet));
+
+  // Jobs run at once; their completion events name status, job, count and buffer.
+  ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_IO_COMPLETION, VI_QUEUE, VI_NULL));
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "xyz"));
+  char acBuf[8] = {};
+  ViJobId nJob = 0;
+  ASSERT_EQ(VI_SUCCESS_SYNC, viReadAsync(m_nVi, reinterpret_cast<ViPBuf>(acBuf), sizeof acBuf, &nJob));
+  ViEvent nContext = 0;
+  ASSERT_EQ(VI_SUCCESS, viWaitOnEvent(m_nVi, VI_EVENT_IO_COMPLETION, 0, VI_NULL, &nContext));
+  ViStatus nStatus = VI_ERROR_SYSTEM_ERROR;
+  ViJobId nEventJob = 0;
+  ViUInt32 nCount = 0;
+  ViAddr pBuffer = nullptr;
+  ViChar szOper[VI_FIND_BUFLEN] = {};
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nContext, VI_ATTR_STATUS, &nStatus));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nContext, VI_ATTR_JOB_ID, &nEventJob));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nContext, VI_ATTR_RET_COUNT_32, &nCount));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nContext, VI_ATTR_BUFFER, &pBuffer));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nContext, VI_ATTR_OPER_NAME, szOper));
+  EXPECT_EQ(VI_SUCCESS, nStatus);
+  EXPECT_EQ(nJob, nEventJob);
+  EXPECT_EQ(3u, nCount);
+  EXPECT_EQ(static_cast<ViAddr>(acBuf), pBuffer);
+  EXPECT_STREQ("viReadAsync", szOper);
+  EXPECT_EQ(std::string("xyz"), acBuf);
+  EXPECT_EQ(VI_ERROR_INV_JOB_ID, viTerminate(m_nVi, VI_NULL, nJob));
+  ASSERT_EQ(VI_SUCCESS_SYNC, viWriteAsync(m_nVi, reinterpret_cast<ViConstBuf>("uv"), 2, &nJob));
+  EXPECT_EQ(VI_SUCCESS, viWaitOnEvent(m_nVi, VI_EVENT_IO_COMPLETION, 0, VI_NULL, VI_NULL));
+  EXPECT_EQ("uv", readAll());
 }
 
 }  // namespace LbVisaHostTest
