@@ -265,6 +265,12 @@ ViStatus CSessionIo::setAttribute(ViAttr nAttr, ViAttrState nValue) {
   }
 }
 
+void CSessionIo::flushIfIdle() {
+  if (!m_aMutex.native().try_lock()) return;
+  flushWrite();
+  m_aMutex.native().unlock();
+}
+
 bool CSessionIo::appendsToFiles() {
   LbCore::CMutexLock aGuard(m_aMutex);
   return m_bAppend == VI_TRUE;

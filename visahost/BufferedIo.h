@@ -47,6 +47,9 @@ class CSessionIo {
   void getAttribute(ViAttr nAttr, void *pValue) EXCLUDES(m_aMutex);
   ViStatus setAttribute(ViAttr nAttr, ViAttrState nValue) EXCLUDES(m_aMutex);
   bool appendsToFiles() EXCLUDES(m_aMutex);
+  // Sends the write buffer unless another thread's operation holds the session (a scan that
+  // waits for the device must not hold up viClose).
+  void flushIfIdle() NO_THREAD_SAFETY_ANALYSIS;
 
  private:
   class CInput;

@@ -30,9 +30,11 @@ ViStatus _VI_FUNC viOpen(ViSession sesn, ViConstRsrc name, ViAccessMode mode, Vi
   return api().open(sesn, name, mode, timeout, vi);
 }
 ViStatus _VI_FUNC viClose(ViObject vi) {
-  // What a session's write buffer holds goes out before it closes; its buffers end with it
-  // (and with every session a closed resource manager took along).
-  viFlush(vi, VI_WRITE_BUF);
+  // What a session's write buffer holds goes out before it closes, unless another thread's
+  // operation holds it; its buffers end with it (and with every session a closed resource
+  // manager took along).
+  ViStatus nKind = VI_SUCCESS;
+  if (std::shared_ptr<CSessionIo> pc = CSessionIo::of(vi, nKind)) pc->flushIfIdle();
   ViStatus nStatus = api().close(vi);
   CSessionIo::forgetClosed();
   return nStatus;

@@ -240,10 +240,9 @@ TEST_F(Events, ClosingEndsAReadThatWaitsWithoutLimit) {
   ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
   ASSERT_EQ(VI_SUCCESS, write(m_nVi, "HANG"));
   ViStatus nRead = VI_SUCCESS;
-  std::thread cReader([&] {
+  std::thread cReader([&] {  // a formatted read, which holds the session's buffers meanwhile
     ViChar acBuf[8];
-    ViUInt32 nRet = 0;
-    nRead = viRead(m_nVi, reinterpret_cast<ViPBuf>(acBuf), sizeof acBuf, &nRet);
+    nRead = viScanf(m_nVi, "%7s", acBuf);
   });
   EXPECT_EQ(VI_SUCCESS, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 30000, VI_NULL, VI_NULL));
   EXPECT_EQ(VI_SUCCESS, viClose(m_nVi));
