@@ -81,6 +81,14 @@ class CAttrParser {
   }
   bool parseUnary(bool bEvaluate) {
     if (eat("!=")) fail();
+    // Nesting is bounded, so that no expression exhausts the stack.
+    struct SDepth {
+      explicit SDepth(CAttrParser &c) : m_c(c) {
+        if (++m_c.m_nDepth > g_nMaxRegexNesting) m_c.fail();
+      }
+      ~SDepth() { --m_c.m_nDepth; }
+      CAttrParser &m_c;
+    } sDepth(*this);
     if (eat("!")) return !parseUnary(bEvaluate);
     if (eat("(")) {
       bool bResult = parseOr(bEvaluate);
@@ -126,7 +134,7 @@ class CAttrParser {
       sCond.m_strText = m_strText.substr(m_nPos, nEnd - m_nPos);
       m_nPos = nEnd + 1;
       if (sCond.m_nOp != LBVISA_OP_EQ && sCond.m_nOp != LBVISA_OP_NE) fail();
-      CRsrcExpr::compile(sCond.m_strText);  // a text value is a regular expression
+      CVisaRegex cCheck(sCond.m_strText);  // a text value is a regular expression
     } else {
       const char *szStart = m_strText.c_str() + m_nPos;
       char *szEnd = nullptr;
@@ -141,71 +149,32 @@ class CAttrParser {
   const std::string &m_strText;
   const CRsrcExpr::FCondition *m_pfCondition;
   size_t m_nPos = 0;
+  unsigned m_nDepth = 0;
 };
 
 }  // namespace
 
-std::regex CRsrcExpr::compile(const std::string &strVisaRegex) {
-  if (strVisaRegex.empty()) throw CInvalidExpression("empty expression");
-  std::string strRegex;
-  bool bInSet = false;
-  for (size_t i = 0; i < strVisaRegex.size(); ++i) {
-    char c = strVisaRegex[i];
-    if (bInSet) {
-      if (c == ']') bInSet = false;
-      if (c == '\\' || c == '[') strRegex += '\\';
-      strRegex += c;
-      continue;
-    }
-    switch (c) {
-      case '?': strRegex += '.'; break;
-      case '*': case '+': case '|': case '(': case ')': strRegex += c; break;
-      case '[':
-        bInSet = true;
-        strRegex += '[';
-        if (i + 1 < strVisaRegex.size() && strVisaRegex[i + 1] == '^') strRegex += strVisaRegex[++i];
-        // A ']' right after the opening is a member, not the end of an empty set.
-        if (i + 1 < strVisaRegex.size() && strVisaRegex[i + 1] == ']') {
-          strRegex += "\\]";
-          ++i;
-        }
-        break;
-      case '\\':
-        if (++i == strVisaRegex.size()) throw CInvalidExpression("trailing backslash");
-        c = strVisaRegex[i];
-        if (std::isalnum(static_cast<unsigned char>(c))) {
-          strRegex += c;
-          break;
-        }
-        strRegex += '\\';
-        strRegex += c;
-        break;
-      case '.': case '^': case '$': case '{': case '}': case ']':
-        strRegex += '\\';
-        strRegex += c;
-        break;
-      default: strRegex += c; break;
-    }
-  }
-  if (bInSet) throw CInvalidExpression("unterminated character set");
-  try {
-    return std::regex(strRegex, std::regex::ECMAScript | std::regex::icase);
-  } catch (const std::regex_error &) {
-    throw CInvalidExpression("invalid regular expression");
-  }
+bool CRsrcExpr::matchesRegex(const std::string &strVisaRegex, const std::string &strText) {
+  return CVisaRegex(strVisaRegex).matches(strText);
 }
 
-CRsrcExpr::CRsrcExpr(const std::string &strExpr) {
-  // The attribute part starts at the first '{' that is neither escaped nor inside a set.
-  size_t nBrace = std::string::npos;
+// The regular-expression part ends at the first '{' that is neither escaped nor inside a set.
+namespace {
+size_t attributeStart(const std::string &strExpr) {
   bool bInSet = false;
-  for (size_t i = 0; i < strExpr.size() && nBrace == std::string::npos; ++i) {
+  for (size_t i = 0; i < strExpr.size(); ++i) {
     if (strExpr[i] == '\\') ++i;
     else if (strExpr[i] == '[') bInSet = true;
     else if (strExpr[i] == ']') bInSet = false;
-    else if (strExpr[i] == '{' && !bInSet) nBrace = i;
+    else if (strExpr[i] == '{' && !bInSet) return i;
   }
-  m_cRegex = compile(strExpr.substr(0, nBrace));
+  return std::string::npos;
+}
+}  // namespace
+
+CRsrcExpr::CRsrcExpr(const std::string &strExpr)
+    : m_cRegex(strExpr.substr(0, attributeStart(strExpr))) {
+  size_t nBrace = attributeStart(strExpr);
   if (nBrace != std::string::npos) {
     if (strExpr.back() != '}' || strExpr.size() - nBrace < 3)
       throw CInvalidExpression("invalid attribute expression");
@@ -215,7 +184,7 @@ CRsrcExpr::CRsrcExpr(const std::string &strExpr) {
 }
 
 bool CRsrcExpr::matches(const std::string &strRsrc) const {
-  return std::regex_match(strRsrc, m_cRegex);
+  return m_cRegex.matches(strRsrc);
 }
 
 bool CRsrcExpr::matchesAttributes(const FCondition &fCondition) const {

@@ -1,20 +1,16 @@
 // Resource expressions of viFindRsrc: a VISA regular expression over the resource string,
 // optionally followed by an attribute expression in braces, e.g. "?*::INSTR{VI_ATTR_MANF_ID==0x3F}".
 //
-// Regular expression: ? any one character, * / + zero / one or more of what precedes,
-// [list] and [^list] character sets, a|b alternatives, (..) groups, \c a literal c; matching
-// covers the whole string and ignores case. Attribute expression: conditions
+// Regular expression: see VisaRegex.h. Attribute expression: conditions
 // "ATTRIBUTE op value" (op ==, !=, <, >, <=, >=; value a number or a quoted string that is a
 // regular expression for == and !=) joined by &&, ||, ! and parentheses.
 // Every constructor throws CRsrcExpr::CInvalidExpression on bad syntax.
 #pragma once
 
 #include <functional>
-#include <memory>
-#include <regex>
-#include <stdexcept>
 #include <string>
 
+#include "visahost/VisaRegex.h"
 #include "visahost/include/visa.h"
 
 namespace LbVisaHost {
@@ -30,10 +26,7 @@ struct SAttrCondition {
 
 class CRsrcExpr {
  public:
-  class CInvalidExpression : public std::runtime_error {
-   public:
-    using std::runtime_error::runtime_error;
-  };
+  using CInvalidExpression = LbVisaHost::CInvalidExpression;
   // Answers whether the resource satisfies one condition.
   using FCondition = std::function<bool(const SAttrCondition &)>;
 
@@ -43,11 +36,11 @@ class CRsrcExpr {
   // Evaluates the attribute expression (true when there is none).
   bool matchesAttributes(const FCondition &fCondition) const;
 
-  // A VISA regular expression as an ECMAScript one; throws CInvalidExpression.
-  static std::regex compile(const std::string &strVisaRegex);
+  // Whether text matches a VISA regular expression (see VisaRegex.h); throws CInvalidExpression.
+  static bool matchesRegex(const std::string &strVisaRegex, const std::string &strText);
 
  private:
-  std::regex m_cRegex;
+  CVisaRegex m_cRegex;
   std::string m_strAttributes;
 };
 

@@ -16,15 +16,14 @@
 #pragma once
 
 #include <condition_variable>
-#include <cstdint>
 #include <deque>
 #include <map>
 #include <memory>
-#include <mutex>
-#include <set>
 #include <string>
 #include <vector>
 
+#include "core/ThreadSafety.h"
+#include "visahost/RuntimeObjects.h"
 #include "visahost/Services.h"
 
 namespace LbVisaHost {
@@ -36,7 +35,8 @@ class CRuntime {
   CRuntime &operator=(const CRuntime &) = delete;
 
   // Services (see Services.h and README.md).
-  ViStatus createLock(ViConstString szName, ViSvcHandle *phLock);
+  ViStatus createLock(ViConstString szName, ViUInt32 nInitial, ViUInt32 nMaximum,
+                      ViSvcHandle *phLock);
   ViStatus acquireLock(ViSvcHandle hLock, ViUInt32 nTimeout);
   ViStatus releaseLock(ViSvcHandle hLock);
   ViStatus createTable(ViConstString szName, ViVersion nVersion, ViSvcHandle *phTable);
@@ -78,50 +78,22 @@ class CRuntime {
   ViStatus installHandler(ViSession nVi, ViEventType nType, ViHndlr pfHandler, ViAddr pUser);
   ViStatus uninstallHandler(ViSession nVi, ViEventType nType, ViHndlr pfHandler, ViAddr pUser);
   ViStatus statusDesc(ViObject nVi, ViStatus nStatus, ViChar szDesc[]);
+  ViStatus readAsync(ViSession nVi, ViPBuf pBuf, ViUInt32 nCount, ViPJobId pnJob);
+  ViStatus writeAsync(ViSession nVi, ViConstBuf pBuf, ViUInt32 nCount, ViPJobId pnJob);
   ViStatus lock(ViSession nVi, ViAccessMode nType, ViUInt32 nTimeout, ViConstKeyId szRequested,
                 ViChar szAccessKey[]);
   ViStatus unlock(ViSession nVi);
 
  private:
-  enum class EKind { ResourceManager, Session, FindList, Event };
-  struct CTable {
-    std::string m_strName;
-    std::map<std::string, ViSvcProc> m_mapOps;
-  };
+  // A counting lock of service 30: acquiring takes one count, releasing gives one back. It
+  // knows no owner and no recursion: a thread that acquires a (1, 1) lock twice waits for itself.
   struct CSvcLock {
-    std::mutex m_aMutex;
+    CSvcLock(ViUInt32 nInitial, ViUInt32 nMaximum) : m_nCount(nInitial), m_nMaximum(nMaximum) {}
+    LbCore::CMutex m_aMutex;
     std::condition_variable m_cvFree;
-    const void *m_pOwner = nullptr;  // identity of the owning thread
-    unsigned m_nDepth = 0;
+    ViUInt32 m_nCount GUARDED_BY(m_aMutex);
+    const ViUInt32 m_nMaximum;
   };
-  struct SHandler {
-    ViEventType m_nType;
-    ViHndlr m_pfHandler;
-    ViAddr m_pUser;
-  };
-  struct CObject {
-    // Record handed to the passport by service 57; [2] is the passport's slot.
-    ViAddr m_apRecord[3] = {};
-    EKind m_eKind;
-    ViObject m_nHandle = 0;
-    ViSession m_nRm = 0;  // owning resource manager of sessions and find lists
-    CTable *m_pcTable = nullptr;
-    std::string m_strRsrc;
-    ViAttrState m_nUserData = 0;
-    bool m_bClosing = false;
-    unsigned m_nCalls = 0;  // calls in progress through the vector table
-    std::set<ViEventType> m_setDeclared;
-    std::map<ViEventType, ViUInt16> m_mapEnabled;
-    std::deque<ViEvent> m_dqQueue;
-    ViUInt32 m_nMaxQueue = 50;
-    std::vector<SHandler> m_vHandlers;
-    std::condition_variable m_cvChanged;  // queue changed, a call returned, or closing
-    std::vector<std::string> m_vFound;
-    size_t m_nNext = 0;
-    ViEventType m_nEventType = 0;  // event contexts: type and session
-    ViSession m_nSource = 0;
-  };
-  using PObject = std::shared_ptr<CObject>;
   struct SRsrcLock {
     ViSession m_nExclusive = 0;
     unsigned m_nExclusiveDepth = 0;
@@ -130,34 +102,47 @@ class CRuntime {
   };
 
   CRuntime() = default;
-  void loadPassports();
-  PObject find(ViObject nHandle) const;  // caller holds m_aMutex
-  CSvcLock *findLock(ViSvcHandle hLock);  // null for a handle service 30 never gave out
-  PObject add(EKind eKind, ViSession nRm, const std::string &strRsrc);
-  void erase(ViObject nHandle);  // caller holds m_aMutex
-  std::vector<CTable *> tablesWith(const char *szOperation);
-  ViStatus closeSession(const PObject &pcSession);
-  bool accessAllowed(const CObject &cSession) const;  // caller holds m_aMutex
-  bool eventTypeKnown(const CObject &cSession, ViEventType nType) const;
-  ViStatus runtimeAttribute(const PObject &pcObject, ViAttr nAttr, void *pValue, bool &bDone);
-  void closeEvent(ViEvent nContext);  // caller holds m_aMutex
+  void loadPassports() EXCLUDES(m_aLoadMutex);
+  PObject find(ViObject nHandle) const REQUIRES(g_aRuntimeMutex);
+  PSession findSession(ViObject nHandle) const REQUIRES(g_aRuntimeMutex);
+  CSvcLock *findLock(ViSvcHandle hLock) EXCLUDES(g_aRuntimeMutex);  // null for a foreign handle
+  void publish(const PObject &pcObject) EXCLUDES(g_aRuntimeMutex);  // gives it a handle
+  void erase(ViObject nHandle) REQUIRES(g_aRuntimeMutex);
+  ViSvcProc operation(const CTable *pcTable, const char *szOp) const REQUIRES(g_aRuntimeMutex);
+  std::vector<CTable *> tablesWith(const char *szOperation) EXCLUDES(g_aRuntimeMutex);
+  ViStatus checkRm(ViSession nRm) EXCLUDES(g_aRuntimeMutex);
+  ViStatus closeSession(const PSession &pcSession) EXCLUDES(g_aRuntimeMutex);
+  bool accessAllowed(const CSession &cSession) const REQUIRES(g_aRuntimeMutex);
+  bool eventTypeKnown(const CSession &cSession, ViEventType nType) const
+      REQUIRES(g_aRuntimeMutex);
+  ViStatus runtimeAttribute(const PObject &pcObject, ViAttr nAttr, void *pValue, bool &bDone)
+      EXCLUDES(g_aRuntimeMutex);
+  static ViStatus parsedAttribute(const CSession &cSession, ViAttr nAttr, void *pValue);
+  void closeEvent(ViEvent nContext) REQUIRES(g_aRuntimeMutex);
+  void releaseRsrcLocks(const CSession &cSession) REQUIRES(g_aRuntimeMutex);
+  // A new session on resource szName, opened through pcTable: parses the name with the
+  // table's viParseRsrcEx, publishes the session and calls the table's viOpen. Null (with
+  // nStatus) when the open fails.
+  PSession openWith(CTable *pcTable, ViSession nRm, ViConstRsrc szName, ViAccessMode nMode,
+                    ViUInt32 nTimeout, ViStatus &nStatus) EXCLUDES(g_aRuntimeMutex);
 
   // Calls operation szOp of the vector table installed on session nVi; VI_ERROR_NSUP_OPER
   // when the table lacks it, VI_ERROR_RSRC_LOCKED when another session locked the resource.
   template <typename F, typename... A>
-  ViStatus route(ViSession nVi, const char *szOp, bool bNeedsAccess, A... args);
+  ViStatus route(ViSession nVi, const char *szOp, bool bNeedsAccess, A... args)
+      EXCLUDES(g_aRuntimeMutex);
 
-  std::mutex m_aLoadMutex;
-  bool m_bLoaded = false;
+  LbCore::CMutex m_aLoadMutex;
+  bool m_bLoaded GUARDED_BY(m_aLoadMutex) = false;
 
-  mutable std::mutex m_aMutex;
   std::condition_variable m_cvLocks;  // a resource lock was released
-  std::map<ViObject, PObject> m_mapObjects;
-  ViObject m_nNextHandle = 0x10000;
-  std::vector<std::unique_ptr<CTable>> m_vTables;
-  std::map<std::string, std::unique_ptr<CSvcLock>> m_mapLocks;
-  std::map<std::string, SRsrcLock> m_mapRsrcLocks;
-  unsigned m_nKeys = 0;
+  std::map<ViObject, PObject> m_mapObjects GUARDED_BY(g_aRuntimeMutex);
+  ViObject m_nNextHandle GUARDED_BY(g_aRuntimeMutex) = 0x10000;
+  std::vector<std::unique_ptr<CTable>> m_vTables GUARDED_BY(g_aRuntimeMutex);
+  std::map<std::string, std::unique_ptr<CSvcLock>> m_mapLocks GUARDED_BY(g_aRuntimeMutex);
+  std::map<std::string, SRsrcLock> m_mapRsrcLocks GUARDED_BY(g_aRuntimeMutex);
+  unsigned m_nKeys GUARDED_BY(g_aRuntimeMutex) = 0;
+  ViJobId m_nLastJob GUARDED_BY(g_aRuntimeMutex) = 0;
 
   // Event handlers run on a thread of the runtime's own, never on the passport's thread that
   // raised the event: a handler may then call any VISA operation, viClose of its session included.
@@ -167,12 +152,17 @@ class CRuntime {
     ViEvent m_nContext;
     bool m_bQueued;  // the context also went to the session's queue and outlives the handlers
   };
-  void postHandlers(const SHandlerJob &sJob);
-  void runHandlers();
-  std::mutex m_aHandlerMutex;
+  void postHandlers(const SHandlerJob &sJob) EXCLUDES(m_aHandlerMutex);
+  // Raises VI_EVENT_IO_COMPLETION of a finished job when the session enabled it.
+  void completeJob(ViSession nVi, const char *szOp, ViJobId nJob, ViStatus nStatus,
+                   ViUInt32 nRet, ViAddr pBuffer) EXCLUDES(g_aRuntimeMutex);
+  // Records a failed operation of session nVi and raises VI_EVENT_EXCEPTION when enabled.
+  void operationFailed(ViSession nVi, ViStatus nStatus, const char *szOp) EXCLUDES(g_aRuntimeMutex);
+  void runHandlers() EXCLUDES(m_aHandlerMutex, g_aRuntimeMutex);
+  LbCore::CMutex m_aHandlerMutex;
   std::condition_variable m_cvHandlerJobs;
-  std::deque<SHandlerJob> m_dqHandlerJobs;
-  bool m_bHandlerThread = false;
+  std::deque<SHandlerJob> m_dqHandlerJobs GUARDED_BY(m_aHandlerMutex);
+  bool m_bHandlerThread GUARDED_BY(m_aHandlerMutex) = false;
 };
 
 // Text for a status; false when the status is unknown.

@@ -93,13 +93,20 @@ ViStatus _VI_FUNC apiLock(ViSession vi, ViAccessMode type, ViUInt32 timeout,
   return LB_RUNTIME_CALL(lock(vi, type, timeout, requested, accessKey));
 }
 ViStatus _VI_FUNC apiUnlock(ViSession vi) { return LB_RUNTIME_CALL(unlock(vi)); }
+ViStatus _VI_FUNC apiReadAsync(ViSession vi, ViPBuf buf, ViUInt32 cnt, ViPJobId job) {
+  return LB_RUNTIME_CALL(readAsync(vi, buf, cnt, job));
+}
+ViStatus _VI_FUNC apiWriteAsync(ViSession vi, ViConstBuf buf, ViUInt32 cnt, ViPJobId job) {
+  return LB_RUNTIME_CALL(writeAsync(vi, buf, cnt, job));
+}
 
 const LbVisaHostApi g_sApi = {
     apiOpenDefaultRM, apiFindRsrc,     apiFindNext,        apiParseRsrc,     apiParseRsrcEx,
     apiOpen,          apiClose,        apiRead,            apiWrite,         apiReadSTB,
     apiClear,         apiAssertTrigger, apiTerminate,      apiGetAttribute,  apiSetAttribute,
     apiEnableEvent,   apiDisableEvent, apiDiscardEvents,   apiWaitOnEvent,   apiInstallHandler,
-    apiUninstallHandler, apiStatusDesc, apiLock,           apiUnlock,
+    apiUninstallHandler, apiStatusDesc, apiLock,           apiUnlock,        apiReadAsync,
+    apiWriteAsync,
 };
 
 }  // namespace
@@ -108,8 +115,9 @@ extern "C" {
 
 const LbVisaHostApi *_VI_FUNC lbVisaHostApi(void) { return &g_sApi; }
 
-ViStatus _VI_FUNC viSvc30(ViConstString name, ViUInt32, ViUInt32, ViSvcHandle *lock) {
-  return LB_RUNTIME_CALL(createLock(name, lock));
+ViStatus _VI_FUNC viSvc30(ViConstString name, ViUInt32 initial, ViUInt32 maximum,
+                          ViSvcHandle *lock) {
+  return LB_RUNTIME_CALL(createLock(name, initial, maximum, lock));
 }
 ViStatus _VI_FUNC viSvc31(ViSvcHandle lock, ViUInt32 timeout, ViUInt32) {
   return LB_RUNTIME_CALL(acquireLock(lock, timeout));

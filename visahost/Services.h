@@ -77,6 +77,8 @@ struct LbVisaHostApi {
   decltype(&::viStatusDesc) statusDesc;
   decltype(&::viLock) lock;
   decltype(&::viUnlock) unlock;
+  decltype(&::viReadAsync) readAsync;
+  decltype(&::viWriteAsync) writeAsync;
 };
 
 LBVISAHOST_EXPORT const LbVisaHostApi *_VI_FUNC lbVisaHostApi(void);

@@ -111,6 +111,7 @@ const SStatusText g_asTexts[] = {
     {VI_ERROR_NSUP_MECH, "VI_ERROR_NSUP_MECH: The specified mechanism is not supported for the given event type."},
     {VI_ERROR_INTF_NUM_NCONFIG, "VI_ERROR_INTF_NUM_NCONFIG: The interface type is valid but the specified interface number is not configured."},
     {VI_ERROR_CONN_LOST, "VI_ERROR_CONN_LOST: The connection for the given session has been lost."},
+    {VI_ERROR_MACHINE_NAVAIL, "VI_ERROR_MACHINE_NAVAIL: The remote machine does not exist or is not accepting any connections."},
     {VI_ERROR_NPERMISSION, "VI_ERROR_NPERMISSION: Access to the resource or remote machine is denied."},
 };
 

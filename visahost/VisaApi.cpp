@@ -1,12 +1,11 @@
-// The VISA C API library: every operation goes to the runtime in the service library.
-#include "visahost/Services.h"
+// The VISA C API library: the operations the runtime in the service library implements.
+// VisaApiIo.cpp adds buffered and formatted I/O, VisaApiUnsupported.cpp the operations these
+// resources do not offer.
+#include "visahost/BufferedIo.h"
+#include "visahost/VisaApiInternal.h"
 
-namespace {
-const LbVisaHostApi &api() {
-  static const LbVisaHostApi *s_psApi = lbVisaHostApi();
-  return *s_psApi;
-}
-}  // namespace
+using LbVisaHost::api;
+using LbVisaHost::CSessionIo;
 
 extern "C" {
 
@@ -30,11 +29,34 @@ ViStatus _VI_FUNC viOpen(ViSession sesn, ViConstRsrc name, ViAccessMode mode, Vi
                          ViPSession vi) {
   return api().open(sesn, name, mode, timeout, vi);
 }
-ViStatus _VI_FUNC viClose(ViObject vi) { return api().close(vi); }
+ViStatus _VI_FUNC viClose(ViObject vi) {
+  // What a session's write buffer holds goes out before it closes, unless another thread's
+  // operation holds it; its buffers end with it (and with every session a closed resource
+  // manager took along).
+  ViStatus nKind = VI_SUCCESS;
+  if (std::shared_ptr<CSessionIo> pc = CSessionIo::of(vi, nKind)) pc->flushIfIdle();
+  ViStatus nStatus = api().close(vi);
+  CSessionIo::forgetClosed();
+  return nStatus;
+}
 ViStatus _VI_FUNC viSetAttribute(ViObject vi, ViAttr attrName, ViAttrState attrValue) {
+  if (LbVisaHost::isBufferAttribute(attrName)) {
+    ViStatus nStatus = VI_SUCCESS;
+    std::shared_ptr<CSessionIo> pc = CSessionIo::of(vi, nStatus);
+    if (!pc) return nStatus == VI_ERROR_NSUP_OPER ? VI_ERROR_NSUP_ATTR : nStatus;
+    return pc->setAttribute(attrName, attrValue);
+  }
   return api().setAttribute(vi, attrName, attrValue);
 }
 ViStatus _VI_FUNC viGetAttribute(ViObject vi, ViAttr attrName, void *attrValue) {
+  if (LbVisaHost::isBufferAttribute(attrName)) {
+    ViStatus nStatus = VI_SUCCESS;
+    std::shared_ptr<CSessionIo> pc = CSessionIo::of(vi, nStatus);
+    if (!pc) return nStatus == VI_ERROR_NSUP_OPER ? VI_ERROR_NSUP_ATTR : nStatus;
+    if (!attrValue) return VI_ERROR_INV_PARAMETER;
+    pc->getAttribute(attrName, attrValue);
+    return VI_SUCCESS;
+  }
   return api().getAttribute(vi, attrName, attrValue);
 }
 ViStatus _VI_FUNC viStatusDesc(ViObject vi, ViStatus status, ViChar desc[]) {

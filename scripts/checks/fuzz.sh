@@ -1,7 +1,9 @@
 #!/usr/bin/env bash
 # Builds the fuzz preset (clang, libFuzzer, ASan+UBSan) and runs every <name>_fuzzer target
-# (resource, scpi, scenario) for a bounded time on its seeds in fuzz/seeds/<name>/ (all together
-# under a minute). Fails on a build failure, a crash, a leak, a timeout or any sanitizer report.
+# for a bounded time on its seeds in fuzz/seeds/<name>/ (all targets together stay under a
+# minute). Fails on a build failure, a crash, a leak, a timeout or any sanitizer report.
+# fuzz/<name>.options, when present, holds further libFuzzer flags of that target (such as a
+# shorter -timeout per input).
 # LB_FUZZ_BUILD_DIR chooses another build folder; LB_FUZZ_SECONDS the time per target.
 set -uo pipefail
 cd "$(dirname "$0")/../.."
@@ -26,7 +28,9 @@ for fuzzer in "$build"/bin/*_fuzzer; do
   # New inputs go to a scratch corpus; the committed seeds stay as they are.
   corpus=$(mktemp -d)
   log="$build/$name-run.log"
-  "$fuzzer" -max_total_time="$seconds" -timeout=10 -rss_limit_mb=2048 -print_final_stats=1 \
+  options=(-timeout=10)
+  [ -f "fuzz/$name.options" ] && read -r -a options <"fuzz/$name.options"
+  "$fuzzer" -max_total_time="$seconds" "${options[@]}" -rss_limit_mb=2048 -print_final_stats=1 \
       -artifact_prefix="$build/$name-" "$corpus" "fuzz/seeds/$name" >"$log" 2>&1
   rc=$?
   rm -rf "$corpus"

@@ -204,9 +204,9 @@ TEST_F(Events, EnableTwiceDisableTwiceAndUnknownTypes)
 {
     ViSession session = open(SENSOR);
     EXPECT_EQ(VI_SUCCESS, viEnableEvent(session, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
-    EXPECT_EQ(VI_ERROR_SYSTEM_ERROR, viEnableEvent(session, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+    EXPECT_EQ(VI_SUCCESS_EVENT_EN, viEnableEvent(session, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
     EXPECT_EQ(VI_SUCCESS, viDisableEvent(session, VI_EVENT_SERVICE_REQ, VI_QUEUE));
-    EXPECT_EQ(VI_ERROR_SYSTEM_ERROR, viDisableEvent(session, VI_EVENT_SERVICE_REQ, VI_QUEUE));
+    EXPECT_EQ(VI_SUCCESS_EVENT_DIS, viDisableEvent(session, VI_EVENT_SERVICE_REQ, VI_QUEUE));
     EXPECT_EQ(VI_SUCCESS, viEnableEvent(session, VI_EVENT_IO_COMPLETION, VI_QUEUE, VI_NULL));
 }
 

@@ -195,13 +195,15 @@ TEST_F(Events, AHandlerMayCloseItsOwnSession) {
   EXPECT_EQ(VI_ERROR_INV_OBJECT, write(m_nVi, "EVENT 1"));
 }
 
-TEST_F(Events, RepeatedEnableAndDisableAreAnsweredByThePassport) {
-  // The test passport refuses a second enable and a disable of what is not enabled, like the
-  // real one; the application sees its answer. A further mechanism is the runtime's alone.
+TEST_F(Events, RepeatedEnableAndDisableAreAnsweredByTheRuntime) {
+  // The test passport refuses a second enable and a disable of what is not enabled: the
+  // runtime answers these itself, with the success codes, and never asks it.
+  EXPECT_EQ(VI_SUCCESS_EVENT_DIS, viDisableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE));
   EXPECT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
-  EXPECT_EQ(VI_ERROR_SYSTEM_ERROR, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+  EXPECT_EQ(VI_SUCCESS_EVENT_EN, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
   EXPECT_EQ(VI_SUCCESS, viDisableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE));
-  EXPECT_EQ(VI_ERROR_SYSTEM_ERROR, viDisableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE));
+  EXPECT_EQ(VI_SUCCESS_EVENT_DIS, viDisableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE));
+  EXPECT_EQ(VI_SUCCESS_EVENT_DIS, viDisableEvent(m_nVi, VI_ALL_ENABLED_EVENTS, VI_ALL_MECH));
   EXPECT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
   EXPECT_EQ(VI_SUCCESS, viDisableEvent(m_nVi, VI_ALL_ENABLED_EVENTS, VI_ALL_MECH));
   // Disabled events are not created, so nothing is queued.
@@ -216,7 +218,36 @@ TEST_F(Events, DisablingAMechanismThatIsNotEnabledKeepsTheOthers) {
   EXPECT_EQ(VI_SUCCESS, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
   // The passport still counts the type as enabled: only the disable that ends it reaches it.
   EXPECT_EQ(VI_SUCCESS, viDisableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE));
-  EXPECT_EQ(VI_ERROR_SYSTEM_ERROR, viDisableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE));
+  EXPECT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+}
+
+TEST_F(Events, FailedOperationsRaiseExceptionsThatNameThem) {
+  ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_EXCEPTION, VI_QUEUE, VI_NULL));
+  ViUInt32 nRet = 0;
+  ASSERT_EQ(VI_ERROR_INV_PARAMETER, viRead(m_nVi, nullptr, 4, &nRet));  // the passport's answer
+  ViEvent nContext = 0;
+  ASSERT_EQ(VI_SUCCESS, viWaitOnEvent(m_nVi, VI_EVENT_EXCEPTION, 0, VI_NULL, &nContext));
+  ViStatus nStatus = VI_SUCCESS;
+  ViChar szOper[VI_FIND_BUFLEN] = {};
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nContext, VI_ATTR_STATUS, &nStatus));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nContext, VI_ATTR_OPER_NAME, szOper));
+  EXPECT_EQ(VI_ERROR_INV_PARAMETER, nStatus);
+  EXPECT_STREQ("viRead", szOper);
+}
+
+TEST_F(Events, ClosingEndsAReadThatWaitsWithoutLimit) {
+  // The passport's read raises a service request once it waits, and ends when it closes.
+  ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+  ASSERT_EQ(VI_SUCCESS, write(m_nVi, "HANG"));
+  ViStatus nRead = VI_SUCCESS;
+  std::thread cReader([&] {  // a formatted read, which holds the session's buffers meanwhile
+    ViChar acBuf[8];
+    nRead = viScanf(m_nVi, "%7s", acBuf);
+  });
+  EXPECT_EQ(VI_SUCCESS, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 30000, VI_NULL, VI_NULL));
+  EXPECT_EQ(VI_SUCCESS, viClose(m_nVi));
+  cReader.join();
+  EXPECT_EQ(VI_ERROR_ABORT, nRead);
 }
 
 TEST_F(Events, WrongTypesAndMechanisms) {

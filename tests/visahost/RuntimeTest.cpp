@@ -104,6 +104,18 @@ TEST_F(Sessions, OperationsMissingFromTheTableAreNotSupported) {
   EXPECT_EQ(VI_ERROR_NSUP_OPER, viClear(nVi));
   EXPECT_EQ(VI_ERROR_NSUP_OPER, viTerminate(nVi, 0, 0));
   EXPECT_EQ(VI_ERROR_NSUP_OPER, viSetAttribute(nVi, VI_ATTR_TMO_VALUE, 2000));
+  // Register-based, memory and bus-specific operations exist for programs written for other
+  // instruments, and are not offered here.
+  ViUInt8 n8 = 0;
+  ViBusAddress nOffset = 0;
+  ViUInt16 nRet = 0;
+  EXPECT_EQ(VI_ERROR_NSUP_OPER, viIn8(nVi, VI_A16_SPACE, 0, &n8));
+  EXPECT_EQ(VI_ERROR_NSUP_OPER, viMemAlloc(nVi, 16, &nOffset));
+  EXPECT_EQ(VI_ERROR_NSUP_OPER, viGpibControlREN(nVi, VI_GPIB_REN_ASSERT));
+  EXPECT_EQ(VI_ERROR_NSUP_OPER, viMapTrigger(nVi, VI_TRIG_TTL0, VI_TRIG_TTL1, VI_NULL));
+  EXPECT_EQ(VI_ERROR_NSUP_OPER, viUsbControlIn(nVi, 0, 0, 0, 0, 1, &n8, &nRet));
+  EXPECT_EQ(VI_ERROR_NSUP_OPER, viMoveEx(m_nRm, VI_A32_SPACE, 0, VI_WIDTH_8, VI_A32_SPACE, 8, VI_WIDTH_8, 1));
+  EXPECT_EQ(VI_ERROR_INV_OBJECT, viAssertUtilSignal(0xDEAD, VI_UTIL_ASSERT_SYSRESET));
   // Operations of the resource manager are not session operations.
   EXPECT_EQ(VI_ERROR_NSUP_OPER, viClear(m_nRm));
   EXPECT_EQ(VI_ERROR_NSUP_OPER, write(m_nRm, "x"));
@@ -128,6 +140,22 @@ TEST_F(Sessions, AttributesOfRuntimeAndPassport) {
   EXPECT_EQ(VI_ERROR_INV_PARAMETER, viGetAttribute(nVi, VI_ATTR_MANF_ID, nullptr));
   EXPECT_EQ(VI_ERROR_NSUP_ATTR_STATE, viSetAttribute(nVi, VI_ATTR_MAX_QUEUE_LENGTH, 0));
   EXPECT_EQ(VI_ERROR_ATTR_READONLY, viSetAttribute(nVi, VI_ATTR_RM_SESSION, 1));
+  // Interface attributes the passport does not answer agree with viParseRsrcEx.
+  ViUInt16 nType = 0, nNum = 0, nAttrType = 0, nAttrNum = 0;
+  ViChar szClass[VI_FIND_BUFLEN] = {}, szExpanded[VI_FIND_BUFLEN] = {}, szAlias[VI_FIND_BUFLEN] = {};
+  ViChar szAttrClass[VI_FIND_BUFLEN] = {}, szInst[VI_FIND_BUFLEN] = {};
+  ASSERT_EQ(VI_SUCCESS, viParseRsrcEx(m_nRm, "TEST::2::INSTR", &nType, &nNum, szClass, szExpanded, szAlias));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nVi, VI_ATTR_INTF_TYPE, &nAttrType));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nVi, VI_ATTR_INTF_NUM, &nAttrNum));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nVi, VI_ATTR_RSRC_CLASS, szAttrClass));
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nVi, VI_ATTR_INTF_INST_NAME, szInst));
+  EXPECT_EQ(nType, nAttrType);
+  EXPECT_EQ(nNum, nAttrNum);
+  EXPECT_STREQ(szClass, szAttrClass);
+  EXPECT_STREQ("TEST", szInst);
+  ViVersion nSpec = 0;
+  EXPECT_EQ(VI_SUCCESS, viGetAttribute(nVi, VI_ATTR_RSRC_SPEC_VERSION, &nSpec));
+  EXPECT_EQ(static_cast<ViVersion>(VI_SPEC_VERSION), nSpec);
 
   ViChar szText[256] = {};
   ViVersion nVersion = 0;
@@ -238,7 +266,8 @@ TEST(StatusDesc, TextsForEveryStatusInUse) {
       VI_ERROR_INV_MECH, VI_ERROR_HNDLR_NINSTALLED, VI_ERROR_INV_HNDLR_REF, VI_ERROR_INV_CONTEXT,
       VI_ERROR_QUEUE_OVERFLOW, VI_ERROR_NENABLED, VI_ERROR_INV_SETUP, VI_ERROR_ALLOC,
       VI_ERROR_NSUP_OPER, VI_ERROR_USER_BUF, VI_ERROR_RSRC_BUSY, VI_ERROR_INV_PARAMETER,
-      VI_ERROR_SESN_NLOCKED, VI_ERROR_NSUP_MECH};
+      VI_ERROR_SESN_NLOCKED, VI_ERROR_NSUP_MECH, VI_ERROR_MACHINE_NAVAIL, VI_WARN_EXT_FUNC_NIMPL,
+      VI_ERROR_INV_FMT, VI_ERROR_NSUP_FMT, VI_ERROR_FILE_IO, VI_ERROR_INTR_PENDING};
   ViChar szDesc[VI_FIND_BUFLEN];
   for (ViStatus nStatus : anStatus) {
     EXPECT_EQ(VI_SUCCESS, viStatusDesc(VI_NULL, nStatus, szDesc)) << std::hex << nStatus;
@@ -283,8 +312,8 @@ TEST_F(Locks, ExclusiveAndSharedLocksGuardTheResource) {
   EXPECT_EQ(VI_SUCCESS, write(nC, "x"));
 
   ViSession nD = VI_NULL;
-  ASSERT_EQ(VI_SUCCESS, viOpen(m_nRm, "test::1::instr", VI_EXCLUSIVE_LOCK, 0, &nD));
-  EXPECT_EQ(VI_ERROR_RSRC_LOCKED, write(nC, "x"));  // the name's case does not matter
+  ASSERT_EQ(VI_SUCCESS, viOpen(m_nRm, "test::1", VI_EXCLUSIVE_LOCK, 0, &nD));
+  EXPECT_EQ(VI_ERROR_RSRC_LOCKED, write(nC, "x"));  // one resource, however it is spelled
   EXPECT_EQ(VI_ERROR_TMO, viOpen(m_nRm, "TEST::1::INSTR", VI_EXCLUSIVE_LOCK, 10, &nA));
   EXPECT_EQ(static_cast<ViSession>(VI_NULL), nA);
 }

@@ -1,11 +1,16 @@
 // A passport for the runtime's tests, built and loaded like the real one and registered only
 // through the service wrapper. Resources "TEST::1::INSTR" and "TEST::2::INSTR" (VI_ATTR_MANF_ID
-// is the number); reads return the last write; a write "EVENT n" raises n service requests;
+// is the number); reads return what the last write left (VI_SUCCESS_MAX_CNT while some is
+// left); a write "EVENT n" raises n service requests;
+// after a write "HANG" a read raises one service request and waits until the session closes;
 // viAssertTrigger, viClear, viTerminate and viSetAttribute are missing on purpose.
 #include <cctype>
+#include <condition_variable>
 #include <cstdlib>
 #include <cstring>
+#include <mutex>
 #include <set>
+#include <stdexcept>
 #include <string>
 
 #include "passport/NiViSv.h"
@@ -26,15 +31,27 @@ struct SSession {
   int m_nNumber;
   std::string m_strData;
   std::set<ViEventType> m_setEnabled;
+  std::mutex m_aMutex;  // for hanging reads
+  std::condition_variable m_cvChanged;
+  bool m_bClosed = false;
+  int m_nReaders = 0;
 };
+
+void raiseServiceRequest(ViSession vi) {
+  ViEvent nContext = 0;
+  ViUInt32 nMech = 0;
+  if (CNiViSv::createEvent(vi, VI_EVENT_SERVICE_REQ, &nContext, &nMech) == VI_SUCCESS)
+    CNiViSv::raiseEvent(vi, nContext, nMech);
+}
 
 SSession *object(ViSession vi) { return static_cast<SSession *>(CNiViSv::sessionRecord(vi)[2]); }
 
+// The resource's number; "TEST::n" names "TEST::n::INSTR" too.
 int number(ViConstRsrc szName) {
   for (int i = 0; i < 2; ++i) {
     size_t n = 0;
     while (szName[n] && std::toupper(static_cast<unsigned char>(szName[n])) == g_aszRsrc[i][n]) ++n;
-    if (szName[n] == '\0' && g_aszRsrc[i][n] == '\0') return i + 1;
+    if (szName[n] == '\0' && (g_aszRsrc[i][n] == '\0' || n == 7)) return i + 1;
   }
   return 0;
 }
@@ -45,6 +62,7 @@ ViStatus _VI_FUNCH findCallback(ViSession vi, ViAttr, ViUInt16, ViAttrState, ViC
 }
 
 ViStatus _VI_FUNC tpFindRsrc(ViSession rm, ViConstString expr, ViFindList *list) {
+  if (std::strcmp(expr, "THROW") == 0) throw std::runtime_error("find failed");
   for (const char *szRsrc : g_aszRsrc) {
     ViUInt16 nFlag = 0;
     ViStatus st = CNiViSv::matchRsrc(rm, expr, szRsrc, &nFlag);
@@ -75,7 +93,7 @@ ViStatus _VI_FUNC tpOpen(ViSession, ViConstRsrc name, ViAccessMode, ViUInt32, Vi
   CNiViSv::acquireLock(g_hLock, 0xFFFFFFFF, 0);
   ViStatus st = VI_ERROR_RSRC_NFOUND;
   if (int n = number(name)) {
-    CNiViSv::sessionRecord(*vi)[2] = new SSession{n, "", {}};
+    CNiViSv::sessionRecord(*vi)[2] = new SSession{n, "", {}, {}, {}, false, 0};
     const ViEventType anTypes[] = {VI_EVENT_SERVICE_REQ};
     CNiViSv::declareEvents(*vi, 1, anTypes, 0);
     st = CNiViSv::installTable(*vi, g_hTable, 0, *vi, 0);
@@ -85,8 +103,15 @@ ViStatus _VI_FUNC tpOpen(ViSession, ViConstRsrc name, ViAccessMode, ViUInt32, Vi
 }
 
 ViStatus _VI_FUNC tpClose(ViSession vi) {
+  SSession *ps = object(vi);
+  {
+    std::unique_lock<std::mutex> aLock(ps->m_aMutex);
+    ps->m_bClosed = true;
+    ps->m_cvChanged.notify_all();
+    ps->m_cvChanged.wait(aLock, [&] { return ps->m_nReaders == 0; });
+  }
   CNiViSv::acquireLock(g_hLock, 0xFFFFFFFF, 0);
-  delete object(vi);
+  delete ps;
   CNiViSv::sessionRecord(vi)[2] = nullptr;
   CNiViSv::releaseLock(g_hLock, 0);
   return VI_SUCCESS;
@@ -96,12 +121,7 @@ ViStatus _VI_FUNC tpWrite(ViSession vi, ViConstBuf buf, ViUInt32 cnt, ViPUInt32 
   if (!buf) return VI_ERROR_INV_PARAMETER;
   object(vi)->m_strData.assign(reinterpret_cast<const char *>(buf), cnt);
   if (object(vi)->m_strData.compare(0, 6, "EVENT ") == 0) {
-    for (int i = std::atoi(object(vi)->m_strData.c_str() + 6); i > 0; --i) {
-      ViEvent nContext = 0;
-      ViUInt32 nMech = 0;
-      if (CNiViSv::createEvent(vi, VI_EVENT_SERVICE_REQ, &nContext, &nMech) == VI_SUCCESS)
-        CNiViSv::raiseEvent(vi, nContext, nMech);
-    }
+    for (int i = std::atoi(object(vi)->m_strData.c_str() + 6); i > 0; --i) raiseServiceRequest(vi);
   }
   if (ret) *ret = cnt;
   return VI_SUCCESS;
@@ -109,11 +129,23 @@ ViStatus _VI_FUNC tpWrite(ViSession vi, ViConstBuf buf, ViUInt32 cnt, ViPUInt32 
 
 ViStatus _VI_FUNC tpRead(ViSession vi, ViPBuf buf, ViUInt32 cnt, ViPUInt32 ret) {
   if (!buf) return VI_ERROR_INV_PARAMETER;
-  const std::string &str = object(vi)->m_strData;
+  SSession *ps = object(vi);
+  if (ps->m_strData == "HANG") {
+    raiseServiceRequest(vi);
+    std::unique_lock<std::mutex> aLock(ps->m_aMutex);
+    ++ps->m_nReaders;
+    ps->m_cvChanged.wait(aLock, [&] { return ps->m_bClosed; });
+    --ps->m_nReaders;
+    ps->m_cvChanged.notify_all();
+    return VI_ERROR_ABORT;
+  }
+  // A read takes what it reads: the rest waits for the next read (VI_SUCCESS_MAX_CNT).
+  std::string &str = ps->m_strData;
   ViUInt32 n = cnt < str.size() ? cnt : static_cast<ViUInt32>(str.size());
   std::memcpy(buf, str.data(), n);
+  str.erase(0, n);
   if (ret) *ret = n;
-  return VI_SUCCESS;
+  return str.empty() ? VI_SUCCESS : VI_SUCCESS_MAX_CNT;
 }
 
 ViStatus _VI_FUNC tpReadSTB(ViSession vi, ViPUInt16 stb) {
@@ -128,7 +160,7 @@ ViStatus _VI_FUNC tpGetAttribute(ViSession vi, ViAttr attr, void *value) {
   return VI_SUCCESS;
 }
 
-// Like the real passport: enabling twice or disabling when not enabled is an error.
+// Enabling twice or disabling when not enabled is an error here: the runtime must not ask.
 ViStatus _VI_FUNC tpEnableEvent(ViSession vi, ViEventType type, ViUInt16, ViEventFilter) {
   return object(vi)->m_setEnabled.insert(type).second ? VI_SUCCESS : VI_ERROR_SYSTEM_ERROR;
 }

@@ -1,9 +1,14 @@
-/* The VISA C API: types, operations, status codes, attributes and events of the VISA standard
-   that this runtime implements. */
+/* The VISA C API: the standard set of types, operations, status codes, attributes, events and
+   other values. Operations this runtime does not offer for its message-based resources exist
+   and answer VI_ERROR_NSUP_OPER (see visahost/README.md). */
 #ifndef LB_VISA_H
 #define LB_VISA_H
 
+#include <stdarg.h>
+
 #include "visatype.h"
+#include "visa_attributes.h"
+#include "visa_values.h"
 
 #define VI_SPEC_VERSION (0x00500800UL)
 
@@ -23,12 +28,16 @@ typedef ViAccessMode *ViPAccessMode;
 typedef ViUInt32 ViJobId;
 typedef ViJobId *ViPJobId;
 typedef ViAttr *ViPAttr;
+typedef va_list ViVAList;
+typedef ViUInt64 ViBusAddress64;
+typedef ViBusAddress64 *ViPBusAddress64;
 
 typedef ViStatus(_VI_FUNCH _VI_PTR ViHndlr)(ViSession vi, ViEventType eventType, ViEvent event,
                                             ViAddr userHandle);
 
 /* Resource manager */
 ViStatus _VI_FUNC viOpenDefaultRM(ViPSession vi);
+#define viGetDefaultRM(vi) viOpenDefaultRM(vi)
 ViStatus _VI_FUNC viFindRsrc(ViSession sesn, ViConstString expr, ViPFindList vi, ViPUInt32 retCnt,
                              ViChar desc[]);
 ViStatus _VI_FUNC viFindNext(ViFindList vi, ViChar desc[]);
@@ -66,68 +75,136 @@ ViStatus _VI_FUNC viWrite(ViSession vi, ViConstBuf buf, ViUInt32 cnt, ViPUInt32 
 ViStatus _VI_FUNC viAssertTrigger(ViSession vi, ViUInt16 protocol);
 ViStatus _VI_FUNC viReadSTB(ViSession vi, ViPUInt16 status);
 ViStatus _VI_FUNC viClear(ViSession vi);
+ViStatus _VI_FUNC viReadAsync(ViSession vi, ViPBuf buf, ViUInt32 cnt, ViPJobId jobId);
+ViStatus _VI_FUNC viReadToFile(ViSession vi, ViConstString filename, ViUInt32 cnt, ViPUInt32 retCnt);
+ViStatus _VI_FUNC viWriteAsync(ViSession vi, ViConstBuf buf, ViUInt32 cnt, ViPJobId jobId);
+ViStatus _VI_FUNC viWriteFromFile(ViSession vi, ViConstString filename, ViUInt32 cnt,
+                                  ViPUInt32 retCnt);
 
-/* Attributes */
-#define VI_ATTR_RSRC_CLASS (0xBFFF0001UL)
-#define VI_ATTR_RSRC_NAME (0xBFFF0002UL)
-#define VI_ATTR_RSRC_IMPL_VERSION (0x3FFF0003UL)
-#define VI_ATTR_RSRC_LOCK_STATE (0x3FFF0004UL)
-#define VI_ATTR_MAX_QUEUE_LENGTH (0x3FFF0005UL)
-#define VI_ATTR_USER_DATA_32 (0x3FFF0007UL)
-#define VI_ATTR_USER_DATA_64 (0x3FFF000AUL)
-#define VI_ATTR_USER_DATA VI_ATTR_USER_DATA_64
-#define VI_ATTR_SEND_END_EN (0x3FFF0016UL)
-#define VI_ATTR_TERMCHAR (0x3FFF0018UL)
-#define VI_ATTR_TMO_VALUE (0x3FFF001AUL)
-#define VI_ATTR_IO_PROT (0x3FFF001CUL)
-#define VI_ATTR_SUPPRESS_END_EN (0x3FFF0036UL)
-#define VI_ATTR_TERMCHAR_EN (0x3FFF0038UL)
-#define VI_ATTR_MANF_NAME (0xBFFF0072UL)
-#define VI_ATTR_MODEL_NAME (0xBFFF0077UL)
-#define VI_ATTR_RM_SESSION (0x3FFF00C4UL)
-#define VI_ATTR_MANF_ID (0x3FFF00D9UL)
-#define VI_ATTR_MODEL_CODE (0x3FFF00DFUL)
-#define VI_ATTR_INTF_INST_NAME (0xBFFF00E9UL)
-#define VI_ATTR_RSRC_SPEC_VERSION (0x3FFF0170UL)
-#define VI_ATTR_INTF_TYPE (0x3FFF0171UL)
-#define VI_ATTR_RSRC_MANF_NAME (0xBFFF0174UL)
-#define VI_ATTR_RSRC_MANF_ID (0x3FFF0175UL)
-#define VI_ATTR_INTF_NUM (0x3FFF0176UL)
-#define VI_ATTR_4882_COMPLIANT (0x3FFF019FUL)
-#define VI_ATTR_USB_SERIAL_NUM (0xBFFF01A0UL)
-#define VI_ATTR_USB_INTFC_NUM (0x3FFF01A1UL)
-#define VI_ATTR_USB_PROTOCOL (0x3FFF01A7UL)
-#define VI_ATTR_USB_MAX_INTR_SIZE (0x3FFF01AFUL)
+/* Formatted and buffered I/O */
+ViStatus _VI_FUNC viSetBuf(ViSession vi, ViUInt16 mask, ViUInt32 size);
+ViStatus _VI_FUNC viFlush(ViSession vi, ViUInt16 mask);
+ViStatus _VI_FUNC viBufWrite(ViSession vi, ViConstBuf buf, ViUInt32 cnt, ViPUInt32 retCnt);
+ViStatus _VI_FUNC viBufRead(ViSession vi, ViPBuf buf, ViUInt32 cnt, ViPUInt32 retCnt);
+ViStatus _VI_FUNCC viPrintf(ViSession vi, ViConstString writeFmt, ...);
+ViStatus _VI_FUNC viVPrintf(ViSession vi, ViConstString writeFmt, ViVAList params);
+ViStatus _VI_FUNCC viSPrintf(ViSession vi, ViPBuf buf, ViConstString writeFmt, ...);
+ViStatus _VI_FUNC viVSPrintf(ViSession vi, ViPBuf buf, ViConstString writeFmt, ViVAList parms);
+ViStatus _VI_FUNCC viScanf(ViSession vi, ViConstString readFmt, ...);
+ViStatus _VI_FUNC viVScanf(ViSession vi, ViConstString readFmt, ViVAList params);
+ViStatus _VI_FUNCC viSScanf(ViSession vi, ViConstBuf buf, ViConstString readFmt, ...);
+ViStatus _VI_FUNC viVSScanf(ViSession vi, ViConstBuf buf, ViConstString readFmt, ViVAList parms);
+ViStatus _VI_FUNCC viQueryf(ViSession vi, ViConstString writeFmt, ViConstString readFmt, ...);
+ViStatus _VI_FUNC viVQueryf(ViSession vi, ViConstString writeFmt, ViConstString readFmt,
+                            ViVAList params);
 
-/* Event attributes */
-#define VI_ATTR_JOB_ID (0x3FFF4006UL)
-#define VI_ATTR_EVENT_TYPE (0x3FFF4010UL)
-#define VI_ATTR_STATUS (0x3FFF4025UL)
-#define VI_ATTR_RET_COUNT_32 (0x3FFF4026UL)
-#define VI_ATTR_RET_COUNT VI_ATTR_RET_COUNT_32
-#define VI_ATTR_BUFFER (0x3FFF4027UL)
-#define VI_ATTR_OPER_NAME (0xBFFF4042UL)
+/* Memory I/O */
+ViStatus _VI_FUNC viIn8(ViSession vi, ViUInt16 space, ViBusAddress offset, ViPUInt8 val8);
+ViStatus _VI_FUNC viOut8(ViSession vi, ViUInt16 space, ViBusAddress offset, ViUInt8 val8);
+ViStatus _VI_FUNC viIn16(ViSession vi, ViUInt16 space, ViBusAddress offset, ViPUInt16 val16);
+ViStatus _VI_FUNC viOut16(ViSession vi, ViUInt16 space, ViBusAddress offset, ViUInt16 val16);
+ViStatus _VI_FUNC viIn32(ViSession vi, ViUInt16 space, ViBusAddress offset, ViPUInt32 val32);
+ViStatus _VI_FUNC viOut32(ViSession vi, ViUInt16 space, ViBusAddress offset, ViUInt32 val32);
+ViStatus _VI_FUNC viIn64(ViSession vi, ViUInt16 space, ViBusAddress offset, ViPUInt64 val64);
+ViStatus _VI_FUNC viOut64(ViSession vi, ViUInt16 space, ViBusAddress offset, ViUInt64 val64);
+ViStatus _VI_FUNC viIn8Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset, ViPUInt8 val8);
+ViStatus _VI_FUNC viOut8Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset, ViUInt8 val8);
+ViStatus _VI_FUNC viIn16Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset, ViPUInt16 val16);
+ViStatus _VI_FUNC viOut16Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset, ViUInt16 val16);
+ViStatus _VI_FUNC viIn32Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset, ViPUInt32 val32);
+ViStatus _VI_FUNC viOut32Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset, ViUInt32 val32);
+ViStatus _VI_FUNC viIn64Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset, ViPUInt64 val64);
+ViStatus _VI_FUNC viOut64Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset, ViUInt64 val64);
+ViStatus _VI_FUNC viMoveIn8(ViSession vi, ViUInt16 space, ViBusAddress offset, ViBusSize length,
+                            ViAUInt8 buf8);
+ViStatus _VI_FUNC viMoveOut8(ViSession vi, ViUInt16 space, ViBusAddress offset, ViBusSize length,
+                             ViAUInt8 buf8);
+ViStatus _VI_FUNC viMoveIn16(ViSession vi, ViUInt16 space, ViBusAddress offset, ViBusSize length,
+                             ViAUInt16 buf16);
+ViStatus _VI_FUNC viMoveOut16(ViSession vi, ViUInt16 space, ViBusAddress offset, ViBusSize length,
+                              ViAUInt16 buf16);
+ViStatus _VI_FUNC viMoveIn32(ViSession vi, ViUInt16 space, ViBusAddress offset, ViBusSize length,
+                             ViAUInt32 buf32);
+ViStatus _VI_FUNC viMoveOut32(ViSession vi, ViUInt16 space, ViBusAddress offset, ViBusSize length,
+                              ViAUInt32 buf32);
+ViStatus _VI_FUNC viMoveIn64(ViSession vi, ViUInt16 space, ViBusAddress offset, ViBusSize length,
+                             ViAUInt64 buf64);
+ViStatus _VI_FUNC viMoveOut64(ViSession vi, ViUInt16 space, ViBusAddress offset, ViBusSize length,
+                              ViAUInt64 buf64);
+ViStatus _VI_FUNC viMoveIn8Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset,
+                              ViBusSize length, ViAUInt8 buf8);
+ViStatus _VI_FUNC viMoveOut8Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset,
+                               ViBusSize length, ViAUInt8 buf8);
+ViStatus _VI_FUNC viMoveIn16Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset,
+                               ViBusSize length, ViAUInt16 buf16);
+ViStatus _VI_FUNC viMoveOut16Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset,
+                                ViBusSize length, ViAUInt16 buf16);
+ViStatus _VI_FUNC viMoveIn32Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset,
+                               ViBusSize length, ViAUInt32 buf32);
+ViStatus _VI_FUNC viMoveOut32Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset,
+                                ViBusSize length, ViAUInt32 buf32);
+ViStatus _VI_FUNC viMoveIn64Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset,
+                               ViBusSize length, ViAUInt64 buf64);
+ViStatus _VI_FUNC viMoveOut64Ex(ViSession vi, ViUInt16 space, ViBusAddress64 offset,
+                                ViBusSize length, ViAUInt64 buf64);
+ViStatus _VI_FUNC viMove(ViSession vi, ViUInt16 srcSpace, ViBusAddress srcOffset,
+                         ViUInt16 srcWidth, ViUInt16 destSpace, ViBusAddress destOffset,
+                         ViUInt16 destWidth, ViBusSize srcLength);
+ViStatus _VI_FUNC viMoveAsync(ViSession vi, ViUInt16 srcSpace, ViBusAddress srcOffset,
+                              ViUInt16 srcWidth, ViUInt16 destSpace, ViBusAddress destOffset,
+                              ViUInt16 destWidth, ViBusSize srcLength, ViPJobId jobId);
+ViStatus _VI_FUNC viMoveEx(ViSession vi, ViUInt16 srcSpace, ViBusAddress64 srcOffset,
+                           ViUInt16 srcWidth, ViUInt16 destSpace, ViBusAddress64 destOffset,
+                           ViUInt16 destWidth, ViBusSize srcLength);
+ViStatus _VI_FUNC viMoveAsyncEx(ViSession vi, ViUInt16 srcSpace, ViBusAddress64 srcOffset,
+                                ViUInt16 srcWidth, ViUInt16 destSpace, ViBusAddress64 destOffset,
+                                ViUInt16 destWidth, ViBusSize srcLength, ViPJobId jobId);
+ViStatus _VI_FUNC viMapAddress(ViSession vi, ViUInt16 mapSpace, ViBusAddress mapOffset,
+                               ViBusSize mapSize, ViBoolean access, ViAddr suggested,
+                               ViPAddr address);
+ViStatus _VI_FUNC viUnmapAddress(ViSession vi);
+ViStatus _VI_FUNC viMapAddressEx(ViSession vi, ViUInt16 mapSpace, ViBusAddress64 mapOffset,
+                                 ViBusSize mapSize, ViBoolean access, ViAddr suggested,
+                                 ViPAddr address);
+void _VI_FUNC viPeek8(ViSession vi, ViAddr address, ViPUInt8 val8);
+void _VI_FUNC viPoke8(ViSession vi, ViAddr address, ViUInt8 val8);
+void _VI_FUNC viPeek16(ViSession vi, ViAddr address, ViPUInt16 val16);
+void _VI_FUNC viPoke16(ViSession vi, ViAddr address, ViUInt16 val16);
+void _VI_FUNC viPeek32(ViSession vi, ViAddr address, ViPUInt32 val32);
+void _VI_FUNC viPoke32(ViSession vi, ViAddr address, ViUInt32 val32);
+void _VI_FUNC viPeek64(ViSession vi, ViAddr address, ViPUInt64 val64);
+void _VI_FUNC viPoke64(ViSession vi, ViAddr address, ViUInt64 val64);
 
-/* Event types */
-#define VI_EVENT_IO_COMPLETION (0x3FFF2009UL)
-#define VI_EVENT_TRIG (0xBFFF200AUL)
-#define VI_EVENT_SERVICE_REQ (0x3FFF200BUL)
-#define VI_EVENT_CLEAR (0x3FFF200DUL)
-#define VI_EVENT_EXCEPTION (0xBFFF200EUL)
-#define VI_EVENT_GPIB_CIC (0x3FFF2012UL)
-#define VI_EVENT_GPIB_TALK (0x3FFF2013UL)
-#define VI_EVENT_GPIB_LISTEN (0x3FFF2014UL)
-#define VI_EVENT_VXI_VME_SYSFAIL (0x3FFF201DUL)
-#define VI_EVENT_VXI_VME_SYSRESET (0x3FFF201EUL)
-#define VI_EVENT_VXI_SIGP (0x3FFF2020UL)
-#define VI_EVENT_VXI_VME_INTR (0xBFFF2021UL)
-#define VI_EVENT_PXI_INTR (0x3FFF2022UL)
-#define VI_EVENT_TCPIP_CONNECT (0x3FFF2036UL)
-#define VI_EVENT_USB_INTR (0x3FFF2037UL)
-#define VI_ALL_ENABLED_EVENTS (0x3FFF7FFFUL)
+/* Shared memory */
+ViStatus _VI_FUNC viMemAlloc(ViSession vi, ViBusSize size, ViPBusAddress offset);
+ViStatus _VI_FUNC viMemFree(ViSession vi, ViBusAddress offset);
+ViStatus _VI_FUNC viMemAllocEx(ViSession vi, ViBusSize size, ViPBusAddress64 offset);
+ViStatus _VI_FUNC viMemFreeEx(ViSession vi, ViBusAddress64 offset);
+
+/* Interface specific */
+ViStatus _VI_FUNC viGpibControlREN(ViSession vi, ViUInt16 mode);
+ViStatus _VI_FUNC viGpibControlATN(ViSession vi, ViUInt16 mode);
+ViStatus _VI_FUNC viGpibSendIFC(ViSession vi);
+ViStatus _VI_FUNC viGpibCommand(ViSession vi, ViConstBuf cmd, ViUInt32 cnt, ViPUInt32 retCnt);
+ViStatus _VI_FUNC viGpibPassControl(ViSession vi, ViUInt16 primAddr, ViUInt16 secAddr);
+ViStatus _VI_FUNC viVxiCommandQuery(ViSession vi, ViUInt16 mode, ViUInt32 cmd,
+                                    ViPUInt32 response);
+ViStatus _VI_FUNC viAssertUtilSignal(ViSession vi, ViUInt16 line);
+ViStatus _VI_FUNC viAssertIntrSignal(ViSession vi, ViInt16 mode, ViUInt32 statusID);
+ViStatus _VI_FUNC viMapTrigger(ViSession vi, ViInt16 trigSrc, ViInt16 trigDest, ViUInt16 mode);
+ViStatus _VI_FUNC viUnmapTrigger(ViSession vi, ViInt16 trigSrc, ViInt16 trigDest);
+ViStatus _VI_FUNC viUsbControlOut(ViSession vi, ViInt16 bmRequestType, ViInt16 bRequest,
+                                  ViUInt16 wValue, ViUInt16 wIndex, ViUInt16 wLength,
+                                  ViConstBuf buf);
+ViStatus _VI_FUNC viUsbControlIn(ViSession vi, ViInt16 bmRequestType, ViInt16 bRequest,
+                                 ViUInt16 wValue, ViUInt16 wIndex, ViUInt16 wLength, ViPBuf buf,
+                                 ViPUInt16 retCnt);
+ViStatus _VI_FUNC viPxiReserveTriggers(ViSession vi, ViInt16 cnt, ViAInt16 trigBuses,
+                                       ViAInt16 trigLines, ViPInt16 failureIndex);
+
 
 /* Completion and warning codes */
-#define VI_SUCCESS (0L)
+#define VI_SUCCESS (0x00000000L)
 #define VI_SUCCESS_EVENT_EN (0x3FFF0002L)
 #define VI_SUCCESS_EVENT_DIS (0x3FFF0003L)
 #define VI_SUCCESS_QUEUE_EMPTY (0x3FFF0004L)
@@ -227,49 +304,8 @@ ViStatus _VI_FUNC viClear(ViSession vi);
 #define VI_ERROR_NSUP_MECH (_VI_ERROR + 0x3FFF00A4L)
 #define VI_ERROR_INTF_NUM_NCONFIG (_VI_ERROR + 0x3FFF00A5L)
 #define VI_ERROR_CONN_LOST (_VI_ERROR + 0x3FFF00A6L)
+#define VI_ERROR_MACHINE_NAVAIL (_VI_ERROR + 0x3FFF00A7L)
 #define VI_ERROR_NPERMISSION (_VI_ERROR + 0x3FFF00A8L)
-
-/* Other values */
-#define VI_FIND_BUFLEN (256)
-
-#define VI_INTF_GPIB (1)
-#define VI_INTF_VXI (2)
-#define VI_INTF_GPIB_VXI (3)
-#define VI_INTF_ASRL (4)
-#define VI_INTF_PXI (5)
-#define VI_INTF_TCPIP (6)
-#define VI_INTF_USB (7)
-
-#define VI_PROT_NORMAL (1)
-#define VI_PROT_FDC (2)
-#define VI_PROT_HS488 (3)
-#define VI_PROT_4882_STRS (4)
-#define VI_PROT_USBTMC_VENDOR (5)
-
-#define VI_QUEUE (1)
-#define VI_HNDLR (2)
-#define VI_SUSPEND_HNDLR (4)
-#define VI_ALL_MECH (0xFFFF)
-#define VI_ANY_HNDLR (0)
-
-#define VI_TRIG_PROT_DEFAULT (0)
-
-#define VI_NO_LOCK (0)
-#define VI_EXCLUSIVE_LOCK (1)
-#define VI_SHARED_LOCK (2)
-#define VI_LOAD_CONFIG (4)
-
-#define VI_TMO_IMMEDIATE (0L)
-#define VI_TMO_INFINITE (0xFFFFFFFFUL)
-
-#define VI_READ_BUF (1)
-#define VI_WRITE_BUF (2)
-#define VI_READ_BUF_DISCARD (4)
-#define VI_WRITE_BUF_DISCARD (8)
-#define VI_IO_IN_BUF (16)
-#define VI_IO_OUT_BUF (32)
-#define VI_IO_IN_BUF_DISCARD (64)
-#define VI_IO_OUT_BUF_DISCARD (128)
 
 #if defined(__cplusplus)
 }

@@ -47,17 +47,36 @@ typedef ViAddr *ViPAddr;
 typedef ViReal32 *ViPReal32;
 typedef ViReal64 *ViPReal64;
 
+/* Arrays */
+typedef ViUInt64 *ViAUInt64;
+typedef ViInt64 *ViAInt64;
+typedef ViUInt32 *ViAUInt32;
+typedef ViInt32 *ViAInt32;
+typedef ViUInt16 *ViAUInt16;
+typedef ViInt16 *ViAInt16;
+typedef ViUInt8 *ViAUInt8;
+typedef ViInt8 *ViAInt8;
+typedef ViChar *ViAChar;
+typedef ViByte *ViAByte;
+typedef ViAddr *ViAAddr;
+typedef ViReal32 *ViAReal32;
+typedef ViReal64 *ViAReal64;
+
 typedef ViUInt16 ViBoolean;
 typedef ViBoolean *ViPBoolean;
+typedef ViBoolean *ViABoolean;
 typedef ViPChar ViString;
 typedef const ViChar *ViConstString;
+typedef ViString *ViPString;
 typedef ViString ViRsrc;
+typedef ViRsrc *ViPRsrc;
 typedef ViConstString ViConstRsrc;
 typedef ViPByte ViBuf;
 typedef ViPByte ViPBuf;
 typedef const ViByte *ViConstBuf;
 typedef ViInt32 ViStatus;
 typedef ViStatus *ViPStatus;
+typedef ViStatus *ViAStatus;
 typedef ViUInt32 ViVersion;
 typedef ViVersion *ViPVersion;
 typedef ViUInt32 ViObject;
