@@ -5,9 +5,9 @@
 #              (/etc for the prefix /usr) naming it, and the example program <bindir>/lbpmx-measure
 #   sensorsim  <libdir>/libPmxControl2_64.so.2, the simulated sensor-control library
 #   dev        <includedir>/lbvisa/ (visa.h, visatype.h, pmxsim/PmxControl2.h, pmxsim/PmxSim.h),
-#              the .so links, <libdir>/pkgconfig/{visa,pmxcontrol2}.pc, the CMake package
-#              <libdir>/cmake/LbPmxVisa (imported targets LbPmxVisa::visa, ::NiViSv64,
-#              ::PmxControl2_64) and the example's source
+#              the .so links, <libdir>/pkgconfig/{visa,pmxcontrol2}.pc (not on Windows), the
+#              CMake package <libdir>/cmake/LbPmxVisa (imported targets LbPmxVisa::visa,
+#              ::NiViSv64, ::PmxControl2_64) and the example's source
 #
 # Windows: every DLL and the example in bin/, where the runtime finds the passport by its file
 # name, import libraries in lib/, and LbViPmx64.reg / LbViPmx64-unregister.reg at the top.
@@ -49,18 +49,17 @@ install(FILES visahost/include/visa.h visahost/include/visatype.h
 install(FILES pmxsim/PmxControl2.h pmxsim/PmxSim.h
   DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/lbvisa/pmxsim COMPONENT dev)
 
-# pkg-config: `pkg-config --cflags --libs visa`.
-set(LB_PC_PREFIX ${CMAKE_INSTALL_PREFIX})
-set(LB_PC_LIBDIR ${CMAKE_INSTALL_FULL_LIBDIR})
-set(LB_PC_INCLUDEDIR ${CMAKE_INSTALL_FULL_INCLUDEDIR})
-get_target_property(LB_PC_VISA_LIB visa OUTPUT_NAME)
-if(NOT LB_PC_VISA_LIB)
-  set(LB_PC_VISA_LIB visa)
+# pkg-config (not on Windows): `pkg-config --cflags --libs visa`.
+if(NOT WIN32)
+  set(LB_PC_PREFIX ${CMAKE_INSTALL_PREFIX})
+  set(LB_PC_LIBDIR ${CMAKE_INSTALL_FULL_LIBDIR})
+  set(LB_PC_INCLUDEDIR ${CMAKE_INSTALL_FULL_INCLUDEDIR})
+  foreach(_lb_pc visa pmxcontrol2)
+    configure_file(packaging/${_lb_pc}.pc.in ${CMAKE_BINARY_DIR}/pkgconfig/${_lb_pc}.pc @ONLY)
+    install(FILES ${CMAKE_BINARY_DIR}/pkgconfig/${_lb_pc}.pc
+      DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT dev)
+  endforeach()
 endif()
-configure_file(packaging/visa.pc.in ${CMAKE_BINARY_DIR}/pkgconfig/visa.pc @ONLY)
-configure_file(packaging/pmxcontrol2.pc.in ${CMAKE_BINARY_DIR}/pkgconfig/pmxcontrol2.pc @ONLY)
-install(FILES ${CMAKE_BINARY_DIR}/pkgconfig/visa.pc ${CMAKE_BINARY_DIR}/pkgconfig/pmxcontrol2.pc
-  DESTINATION ${CMAKE_INSTALL_LIBDIR}/pkgconfig COMPONENT dev)
 
 # CMake: find_package(LbPmxVisa) and link LbPmxVisa::visa.
 include(CMakePackageConfigHelpers)
