@@ -24,7 +24,11 @@ if(NOT WIN32 AND NOT CMAKE_INSTALL_PREFIX MATCHES "^/(usr/?)?$")
   file(RELATIVE_PATH _lb_bin_to_lib ${CMAKE_INSTALL_FULL_BINDIR} ${CMAKE_INSTALL_FULL_LIBDIR})
   set_target_properties(visa NiViSv64 PmxControl2_64 PROPERTIES INSTALL_RPATH "$ORIGIN")
   set_target_properties(LbViPmx64 PROPERTIES INSTALL_RPATH "$ORIGIN/..")
-  set_target_properties(lbpmx-measure PROPERTIES INSTALL_RPATH "$ORIGIN/${_lb_bin_to_lib}")
+  foreach(_lb_program lbpmx-measure lbpmx-lan)
+    if(TARGET ${_lb_program})
+      set_target_properties(${_lb_program} PROPERTIES INSTALL_RPATH "$ORIGIN/${_lb_bin_to_lib}")
+    endif()
+  endforeach()
 endif()
 
 install(TARGETS visa NiViSv64 EXPORT LbPmxVisaTargets
@@ -38,10 +42,11 @@ install(TARGETS PmxControl2_64 EXPORT LbPmxVisaTargets
   ARCHIVE DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT dev
   INCLUDES DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/lbvisa)
 install(TARGETS LbViPmx64 LIBRARY DESTINATION ${LB_PASSPORT_DIR} COMPONENT passport)
-install(TARGETS lbpmx-measure RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT passport)
-if(TARGET lbpmx-lan)
-  install(TARGETS lbpmx-lan RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT passport)
-endif()
+foreach(_lb_program lbpmx-measure lbpmx-lan)
+  if(TARGET ${_lb_program})
+    install(TARGETS ${_lb_program} RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT passport)
+  endif()
+endforeach()
 
 # Headers, kept in their own folder beside other VISA implementations' headers.
 install(FILES visahost/include/visa.h visahost/include/visatype.h
