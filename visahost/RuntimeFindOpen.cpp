@@ -6,6 +6,7 @@
 #include <cstdio>
 
 #include "visahost/Module.h"
+#include "visahost/PassportConfig.h"
 #include "visahost/RsrcExpr.h"
 
 namespace LbVisaHost {
@@ -14,21 +15,9 @@ void CRuntime::loadPassports() {
   LbCore::CMutexLock aGuard(m_aLoadMutex);
   if (m_bLoaded) return;
   m_bLoaded = true;
-  std::vector<std::string> vPaths;
-  bool bConfigured = true;
-  std::string strList = Module::environment("LBVISA_PASSPORTS");
-  size_t nStart = 0;
-  while (nStart <= strList.size() && !strList.empty()) {
-    size_t nEnd = strList.find(Module::pathListSeparator(), nStart);
-    if (nEnd == std::string::npos) nEnd = strList.size();
-    if (nEnd > nStart) vPaths.push_back(strList.substr(nStart, nEnd - nStart));
-    nStart = nEnd + 1;
-  }
-  if (vPaths.empty()) vPaths = Module::configuredPassports();
-  if (vPaths.empty()) {
-    vPaths.push_back(Module::defaultPassport());
-    bConfigured = false;
-  }
+  const PassportConfig::SPassports sPassports = PassportConfig::passports();
+  const std::vector<std::string> &vPaths = sPassports.m_vPaths;
+  const bool bConfigured = sPassports.m_bConfigured;
   for (const std::string &strPath : vPaths) {
     std::string strFull = Module::hasDirectory(strPath) ? strPath : Module::runtimeDirectory() + strPath;
     std::string strError;
