@@ -98,12 +98,13 @@ ViStatus _VI_FUNC entryOpen(ViSession, ViConstRsrc name, ViAccessMode mode, ViUI
     }
     object->setVisaSession(*session, record);
     ViStatus status = object->viOpen(name, mode, timeout);
-    // The object may hold the last reference to a sensor session that it just created, whose
-    // release may close the driver: like every release, under the passport lock.
-    CPassportLock lock;
     if (status < VI_SUCCESS) {
-        delete object;
+        // The object may hold the last reference to a sensor session that it just created, whose
+        // release may close the driver: viClose releases it, like every release, under the
+        // passport lock (which is not re-entrant, so it is not held here).
+        object->viClose();
     } else {
+        CPassportLock lock;
         s_cOpenObjects.insert(object);
     }
     return status;
@@ -286,12 +287,17 @@ void detachProcess(EDetach kind)
         // left open are closed as by viClose, which stops their event threads and closes their
         // sensors and, with the last one, the driver (joining the library's thread). A driver
         // that would not close keeps no callback.
-        CPassportLock lock;
-        std::vector<CBasePassport*> objects(s_cOpenObjects.begin(), s_cOpenObjects.end());
-        s_cOpenObjects.clear();
+        // The passport lock is not re-entrant and viClose takes it itself.
+        std::vector<CBasePassport*> objects;
+        {
+            CPassportLock lock;
+            objects.assign(s_cOpenObjects.begin(), s_cOpenObjects.end());
+            s_cOpenObjects.clear();
+        }
         for (std::size_t i = 0; i < objects.size(); ++i) {
             objects[i]->viClose();
         }
+        CPassportLock lock;
         if (getAdapter().isDriverOpen()) {
             getAdapter().closeDriver();
         }

@@ -161,7 +161,7 @@ TEST_F(Answers, RefusedCommandsFailAtOnceUnderContention)
             threads.emplace_back([this, serial] {
                 ViSession session = open(std::string("LBPMX::3::") + serial);
                 for (int i = 0; i < 25; ++i) {
-                    ASSERT_EQ(VI_ERROR_NSUP_OPER, write(session, "MEAS?\r\n")) << serial << " #" << i;
+                    ASSERT_EQ(VI_ERROR_NSUP_OPER, write(session, "SYST:BOGUS?\r\n")) << serial << " #" << i;
                     ASSERT_EQ(VI_SUCCESS, write(session, "*IDN?\r\n"));
                     EXPECT_EQ(std::string("Marlowe&Tenby,PMX-M01,") + serial + ",1.20", read(session));
                 }
