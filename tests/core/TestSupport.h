@@ -2,19 +2,14 @@
 #define LBTESTS_CORE_TESTSUPPORT_H
 // Helpers shared by the core tests: a one-shot latch and a log appender that keeps lines.
 #include "core/Log.h"
+#include "tests/ThreadState.h"
 
 #include <chrono>
 #include <condition_variable>
-#include <fstream>
-#include <thread>
 #include <mutex>
 #include <string>
 #include <vector>
 
-#if defined(__linux__)
-#include <sys/syscall.h>
-#include <unistd.h>
-#endif
 
 namespace LbTests {
 
@@ -48,44 +43,6 @@ private:
     std::condition_variable m_cCondition;
     bool m_bOpen = false;
 };
-
-// The calling thread's kernel id where the system has one (Linux), else 0.
-inline long currentThreadId()
-{
-#if defined(__linux__)
-    return static_cast<long>(::syscall(SYS_gettid));
-#else
-    return 0;
-#endif
-}
-
-// Waits (bounded by kDeadline) until the thread with that kernel id sleeps in the kernel, so a
-// test can wake a waiter that is really waiting. Where thread states cannot be read (id 0, or
-// not Linux) it returns at once: the test then still runs, only without that guarantee.
-inline bool waitUntilSleeping(long threadId)
-{
-#if defined(__linux__)
-    if (threadId == 0) {
-        return true;
-    }
-    const std::string path = "/proc/self/task/" + std::to_string(threadId) + "/stat";
-    const auto end = std::chrono::steady_clock::now() + kDeadline;
-    while (std::chrono::steady_clock::now() < end) {
-        std::ifstream stat(path);
-        std::string line;
-        std::getline(stat, line);
-        const std::size_t close = line.rfind(')'); // the name in parentheses may hold blanks
-        if (close != std::string::npos && close + 2 < line.size() && line[close + 2] == 'S') {
-            return true;
-        }
-        std::this_thread::yield();
-    }
-    return false;
-#else
-    (void)threadId;
-    return true;
-#endif
-}
 
 // Attaches itself for its lifetime and restores the log threshold it found.
 class CCaptureAppender : public LbCore::CILogAppender {

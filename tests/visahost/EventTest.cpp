@@ -1,5 +1,8 @@
 // Events raised by the test passport (a write "EVENT n" raises n service requests) and their
 // delivery through the VISA queue and handlers.
+#include "tests/ThreadState.h"
+
+#include <atomic>
 #include <chrono>
 #include <condition_variable>
 #include <mutex>
@@ -79,12 +82,15 @@ TEST_F(Events, WaiterInAnotherThreadIsWoken) {
 TEST_F(Events, ClosingTheSessionEndsAWait) {
   ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
   ViStatus nStatus = VI_SUCCESS;
+  std::atomic<long> nWaiterId(-1);
   std::thread cWaiter([&] {
+    nWaiterId = LbTests::currentThreadId();
     nStatus = viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_TMO_INFINITE, VI_NULL, VI_NULL);
   });
+  while (nWaiterId.load() == -1) std::this_thread::yield();
+  ASSERT_TRUE(LbTests::waitUntilSleeping(nWaiterId.load()));  // the close meets a real wait
   EXPECT_EQ(VI_SUCCESS, viClose(m_nVi));
   cWaiter.join();
-  // Either the wait saw the close, or it started after it.
   EXPECT_EQ(VI_ERROR_INV_OBJECT, nStatus);
 }
 
