@@ -4,7 +4,7 @@
 #   passport   <libdir>/lbvisa/LbViPmx64.so, <prefix>/etc/lbvisa/passports.d/LbViPmx64.conf
 #              (/etc for the prefix /usr) naming it, and the example program <bindir>/lbpmx-measure
 #   sensorsim  <libdir>/libPmxControl2_64.so.2, the simulated sensor-control library
-#   dev        <includedir>/lbvisa/ (visa.h, visatype.h, pmxsim/PmxControl2.h, pmxsim/PmxSim.h),
+#   dev        <includedir>/lbvisa/ (visa.h and the headers it includes, pmxsim/PmxControl2.h, pmxsim/PmxSim.h),
 #              the .so links, <libdir>/pkgconfig/{visa,pmxcontrol2}.pc (not on Windows), the
 #              CMake package <libdir>/cmake/LbPmxVisa (imported targets LbPmxVisa::visa,
 #              ::NiViSv64, ::PmxControl2_64) and the example's source
@@ -49,8 +49,8 @@ foreach(_lb_program lbpmx-measure lbpmx-lan)
 endforeach()
 
 # Headers, kept in their own folder beside other VISA implementations' headers.
-install(FILES visahost/include/visa.h visahost/include/visatype.h
-  DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/lbvisa COMPONENT dev)
+install(DIRECTORY visahost/include/ DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/lbvisa COMPONENT dev
+  FILES_MATCHING PATTERN "*.h")
 install(FILES pmxsim/PmxControl2.h pmxsim/PmxSim.h
   DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/lbvisa/pmxsim COMPONENT dev)
 

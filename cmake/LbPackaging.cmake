@@ -6,6 +6,7 @@
 #                                depends on the runtime and on any sensor-control library
 #   pmxcontrol2-sim  sensorsim   the simulated sensor-control library; provides (and conflicts
 #                                with) pmxcontrol2, so a real vendor library package replaces it
+#   python3-pmxsim   python      the Python module pmxsim that scripts the simulated sensors
 #   lbvisa-dev       dev         headers, .so links, pkg-config and CMake files, example source
 set(LB_MAINTAINER "Marlowe and Tenby Packaging <packaging@marlowe-tenby.example>")
 set(LB_COPYRIGHT_HOLDER "Marlowe&Tenby")
@@ -14,7 +15,7 @@ set(CPACK_PACKAGE_NAME LbPmxVisa)
 set(CPACK_PACKAGE_VENDOR "${LB_COPYRIGHT_HOLDER}")
 set(CPACK_PACKAGE_CONTACT "${LB_MAINTAINER}")
 set(CPACK_PACKAGE_VERSION ${PROJECT_VERSION})
-set(CPACK_COMPONENTS_ALL runtime passport sensorsim dev)
+set(CPACK_COMPONENTS_ALL runtime passport sensorsim python dev)
 set(CPACK_STRIP_FILES ON)
 
 if(WIN32)
@@ -66,6 +67,15 @@ and PMX-M10 100001; PMXSIM_DEVICES chooses others), for running the
 passport without hardware. It provides pmxcontrol2, the sensor-control
 library the passport needs, so the vendor's library replaces it.")
 
+set(CPACK_DEBIAN_PYTHON_PACKAGE_NAME python3-pmxsim)
+set(CPACK_DEBIAN_PYTHON_PACKAGE_SECTION python)
+set(CPACK_DEBIAN_PYTHON_PACKAGE_ARCHITECTURE all)
+set(CPACK_DEBIAN_PYTHON_PACKAGE_DEPENDS "python3:any, pmxcontrol2-sim (= ${_lb_v})")
+set(CPACK_COMPONENT_PYTHON_DESCRIPTION "Python module pmxsim for the simulated power sensors
+Scripts the simulated sensor-control library that the process's VISA
+runtime loaded: attaches and detaches sensors, queues results, injects
+errors and faults, loads scenario files. Includes a pytest fixture.")
+
 set(CPACK_DEBIAN_DEV_PACKAGE_NAME lbvisa-dev)
 set(CPACK_DEBIAN_DEV_PACKAGE_SECTION libdevel)
 set(CPACK_DEBIAN_DEV_PACKAGE_DEPENDS "lbvisa-runtime (= ${_lb_v}), pmxcontrol2")
@@ -80,7 +90,7 @@ imported targets, and the source of the example program.")
 string(TIMESTAMP LB_CHANGELOG_DATE "%a, %d %b %Y %H:%M:%S +0000" UTC)
 string(TIMESTAMP LB_COPYRIGHT_YEAR "%Y" UTC)
 configure_file(packaging/debian/copyright.in ${CMAKE_BINARY_DIR}/packaging/copyright @ONLY)
-foreach(_lb_comp runtime passport sensorsim dev)
+foreach(_lb_comp runtime passport sensorsim python dev)
   string(TOUPPER ${_lb_comp} _lb_upper)
   set(LB_DEB_PACKAGE ${CPACK_DEBIAN_${_lb_upper}_PACKAGE_NAME})
   set(_lb_doc ${CMAKE_BINARY_DIR}/packaging/doc/${LB_DEB_PACKAGE})

@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
 # Builds the packages into build/packages/:
-#   - the Debian packages lbvisa-runtime, lbpmx-passport, pmxcontrol2-sim and lbvisa-dev, with
+#   - the Debian packages lbvisa-runtime, lbpmx-passport, pmxcontrol2-sim, python3-pmxsim and lbvisa-dev, with
 #     CPack from the release build (configured here with the prefix /usr), checked with lintian
 #     (any error fails);
 #   - LbPmxVisa-<version>-win64.zip, with CPack from the Windows cross build (mingw).

@@ -16,7 +16,7 @@ set -uo pipefail
 cd "$(dirname "$0")/../.."
 root=$PWD
 SUDO=""; [ "$(id -u)" -eq 0 ] || SUDO=sudo
-packages=(lbvisa-dev lbpmx-passport pmxcontrol2-sim lbvisa-runtime)
+packages=(lbvisa-dev python3-pmxsim lbpmx-passport pmxcontrol2-sim lbvisa-runtime)
 key='HKLM\SOFTWARE\National Instruments\NI-VISA for Windows 95/NT\CurrentVersion\IoLibraries\LbViPmx.dll'
 unset LBVISA_PASSPORTS PMXSIM_DEVICES LD_LIBRARY_PATH LBVIPMX_LOG_LEVEL LBVIPMX_LOG_FILE
 
@@ -55,7 +55,7 @@ if ! timeout 540 bash scripts/package.sh >"$tmp/package.log" 2>&1; then
 fi
 grep -E "^[EW]: " "$tmp/package.log" | sed 's/^/  lintian /'
 version=$(sed -nE 's/^project\([A-Za-z]+ VERSION ([0-9.]+).*/\1/p' CMakeLists.txt)
-debs=(build/packages/{lbvisa-runtime,pmxcontrol2-sim,lbpmx-passport,lbvisa-dev}_"${version}"_*.deb)
+debs=(build/packages/{lbvisa-runtime,pmxcontrol2-sim,lbpmx-passport,lbvisa-dev,python3-pmxsim}_"${version}"_*.deb)
 zip=build/packages/LbPmxVisa-$version-win64.zip
 
 # --- Debian packages
@@ -67,6 +67,7 @@ echo "installed: $(dpkg-query -W -f='${Package} ${Version}, ' "${packages[@]}")"
 
 # pyvisa as a user runs it: no library path, no configuration of its own, only system packages.
 cat >"$tmp/installed.py" <<'PY'
+import ctypes
 import sys
 sys.path.insert(0, sys.argv[1])
 import pyvisa
@@ -78,9 +79,12 @@ assert str(rm.visalib.library_path).startswith("/usr/lib/"), rm.visalib.library_
 names = rm.list_resources()
 print("  resources: %s" % ", ".join(names))
 assert len(names) == 2, names
+# The simulated library the installed passport loaded (the same instance: same file, same soname).
+sim = ctypes.CDLL("libPmxControl2_64.so.2")
+sim.PmxSimQueueResult.argtypes = [ctypes.c_char_p, ctypes.c_int32, ctypes.c_void_p, ctypes.c_int32]
 for name in names:
     inst = rm.open_resource(name)
-    pyvisa_smoke.run_session(inst)
+    pyvisa_smoke.run_session(inst, sim)
     inst.close()
 rm.close()
 PY
