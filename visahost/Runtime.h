@@ -163,7 +163,8 @@ class CRuntime {
   };
   void postHandlers(const SHandlerJob &sJob) EXCLUDES(m_aHandlerMutex);
   // Runs asynchronous job szOp on session nVi at once: fIo(ViUInt32 &nRet) performs its I/O,
-  // then VI_EVENT_IO_COMPLETION reports the outcome. Answers VI_SUCCESS_SYNC once it ran.
+  // then VI_EVENT_IO_COMPLETION reports the outcome. Answers VI_SUCCESS_SYNC once it ran, the
+  // failure of the session's lookup (openSession) when it could not start.
   template <typename F>
   ViStatus runJob(ViSession nVi, const char *szOp, ViAddr pBuffer, ViPJobId pnJob, F fIo)
       EXCLUDES(g_aRuntimeMutex);
