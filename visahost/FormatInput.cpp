@@ -231,7 +231,7 @@ class CScanner {
     }
     unsigned char *p = s.m_bSuppress ? nullptr : va_arg(m_sArgs.m_ap, unsigned char *);
     if (!p && !s.m_bSuppress) throw SUserBuf();
-    bool bSwap = (s.m_bLittleEndian ? !isLittleEndian() : isLittleEndian()) && nSize > 1;
+    bool bSwap = swapsBytes(s.m_bLittleEndian, nSize);
     size_t nStored = 0, nElement = 0;
     unsigned char acElement[8];
     for (size_t i = 0; i < nBytes && m_cIn.peek() >= 0; ++i) {
@@ -246,13 +246,6 @@ class CScanner {
       ++nStored;
     }
     if (pnInOut) *pnInOut = static_cast<ViInt32>(nStored < nMaxElements ? nStored : nMaxElements);
-  }
-
-  static bool isLittleEndian() {
-    const unsigned n = 1;
-    unsigned char c;
-    std::memcpy(&c, &n, 1);
-    return c == 1;
   }
 
   SArgs &m_sArgs;

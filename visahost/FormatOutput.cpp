@@ -15,6 +15,14 @@ size_t binaryElementSize(const std::string &strModifier) {
   return 1;
 }
 
+bool swapsBytes(bool bLittleEndianData, size_t nSize) {
+  const unsigned n = 1;
+  unsigned char c;
+  std::memcpy(&c, &n, 1);
+  const bool bLittleEndianHost = c == 1;
+  return bLittleEndianData != bLittleEndianHost && nSize > 1;
+}
+
 namespace {
 
 // snprintf of one value into strOut; the C library does every number conversion.
@@ -124,17 +132,10 @@ class CFormatter {
       m_strOut += "#0";
     }
     // Elements go out big-endian ("!ob", the default) or little-endian ("!ol").
-    bool bSwap = (s.m_bLittleEndian ? !isLittleEndian() : isLittleEndian()) && nSize > 1;
+    bool bSwap = swapsBytes(s.m_bLittleEndian, nSize);
     for (size_t i = 0; i < nBytes; i += nSize)
       for (size_t j = 0; j < nSize; ++j)
         m_strOut += static_cast<char>(p[i + (bSwap ? nSize - 1 - j : j)]);
-  }
-
-  static bool isLittleEndian() {
-    const unsigned n = 1;
-    unsigned char c;
-    std::memcpy(&c, &n, 1);
-    return c == 1;
   }
 
   SArgs &m_sArgs;

@@ -38,4 +38,8 @@ ViStatus scanInput(ViConstString szFormat, SArgs &sArgs, CScanInput &cInput);
 // Bytes of an element of binary data for a modifier ("" 1, h 2, l z 4, ll L Z 8).
 size_t binaryElementSize(const std::string &strModifier);
 
+// Whether elements of nSize bytes change byte order between this machine and binary data that
+// is little-endian ("!ol") or big-endian (the default).
+bool swapsBytes(bool bLittleEndianData, size_t nSize);
+
 }  // namespace LbVisaHost

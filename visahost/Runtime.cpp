@@ -60,6 +60,17 @@ PSession CRuntime::findSession(ViObject nHandle) const {
   return as<CSession>(find(nHandle), EKind::Session);
 }
 
+PSession CRuntime::openSession(ViObject nVi, ViStatus nNotSession, ViStatus &nStatus) const {
+  PObject pcObject = find(nVi);
+  PSession pc = as<CSession>(pcObject, EKind::Session);
+  if (!pcObject || (pc && pc->m_bClosing)) {
+    nStatus = VI_ERROR_INV_OBJECT;
+    return nullptr;
+  }
+  if (!pc) nStatus = nNotSession;
+  return pc;
+}
+
 void CRuntime::publish(const PObject &pc) {
   LbCore::CMutexLock aGuard(g_aRuntimeMutex);
   if (m_nNextHandle == VI_NULL) ++m_nNextHandle;

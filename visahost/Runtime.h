@@ -105,6 +105,15 @@ class CRuntime {
   void loadPassports() EXCLUDES(m_aLoadMutex);
   PObject find(ViObject nHandle) const REQUIRES(g_aRuntimeMutex);
   PSession findSession(ViObject nHandle) const REQUIRES(g_aRuntimeMutex);
+  // The open session nVi names, for an operation of the application. Null with nStatus
+  // VI_ERROR_INV_OBJECT when nVi names nothing or a closing session, with nNotSession when it
+  // names another kind of object.
+  PSession openSession(ViObject nVi, ViStatus nNotSession, ViStatus &nStatus) const
+      REQUIRES(g_aRuntimeMutex);
+  // openSession for an operation on events of type nType (also VI_ALL_ENABLED_EVENTS where
+  // bAllTypes): VI_ERROR_INV_EVENT for another kind of object or a type the session does not know.
+  PSession eventSession(ViSession nVi, ViEventType nType, bool bAllTypes, ViStatus &nStatus) const
+      REQUIRES(g_aRuntimeMutex);
   CSvcLock *findLock(ViSvcHandle hLock) EXCLUDES(g_aRuntimeMutex);  // null for a foreign handle
   void publish(const PObject &pcObject) EXCLUDES(g_aRuntimeMutex);  // gives it a handle
   void erase(ViObject nHandle) REQUIRES(g_aRuntimeMutex);
@@ -153,6 +162,12 @@ class CRuntime {
     bool m_bQueued;  // the context also went to the session's queue and outlives the handlers
   };
   void postHandlers(const SHandlerJob &sJob) EXCLUDES(m_aHandlerMutex);
+  // Runs asynchronous job szOp on session nVi at once: fIo(ViUInt32 &nRet) performs its I/O,
+  // then VI_EVENT_IO_COMPLETION reports the outcome. Answers VI_SUCCESS_SYNC once it ran, the
+  // failure of the session's lookup (openSession) when it could not start.
+  template <typename F>
+  ViStatus runJob(ViSession nVi, const char *szOp, ViAddr pBuffer, ViPJobId pnJob, F fIo)
+      EXCLUDES(g_aRuntimeMutex);
   // Raises VI_EVENT_IO_COMPLETION of a finished job when the session enabled it.
   void completeJob(ViSession nVi, const char *szOp, ViJobId nJob, ViStatus nStatus,
                    ViUInt32 nRet, ViAddr pBuffer) EXCLUDES(g_aRuntimeMutex);

@@ -27,38 +27,30 @@ void CRuntime::completeJob(ViSession nVi, const char *szOp, ViJobId nJob, ViStat
   raiseEvent(nVi, pcEvent->m_nHandle, nMech);
 }
 
-ViStatus CRuntime::readAsync(ViSession nVi, ViPBuf pBuf, ViUInt32 nCount, ViPJobId pnJob) {
+template <typename F>
+ViStatus CRuntime::runJob(ViSession nVi, const char *szOp, ViAddr pBuffer, ViPJobId pnJob, F fIo) {
   ViJobId nJob;
   {
     LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-    PObject pcObject = find(nVi);
-    PSession pc = as<CSession>(pcObject, EKind::Session);
-    if (!pcObject || (pc && pc->m_bClosing)) return VI_ERROR_INV_OBJECT;
-    if (!pc) return VI_ERROR_NSUP_OPER;
+    ViStatus nStatus = VI_SUCCESS;
+    if (!openSession(nVi, VI_ERROR_NSUP_OPER, nStatus)) return nStatus;
     nJob = ++m_nLastJob;
   }
   if (pnJob) *pnJob = nJob;
   ViUInt32 nRet = 0;
-  ViStatus nStatus = read(nVi, pBuf, nCount, &nRet);
-  completeJob(nVi, "viReadAsync", nJob, nStatus, nRet, pBuf);
+  ViStatus nStatus = fIo(nRet);
+  completeJob(nVi, szOp, nJob, nStatus, nRet, pBuffer);
   return VI_SUCCESS_SYNC;
 }
 
+ViStatus CRuntime::readAsync(ViSession nVi, ViPBuf pBuf, ViUInt32 nCount, ViPJobId pnJob) {
+  return runJob(nVi, "viReadAsync", pBuf, pnJob,
+                [&](ViUInt32 &nRet) { return read(nVi, pBuf, nCount, &nRet); });
+}
+
 ViStatus CRuntime::writeAsync(ViSession nVi, ViConstBuf pBuf, ViUInt32 nCount, ViPJobId pnJob) {
-  ViJobId nJob;
-  {
-    LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-    PObject pcObject = find(nVi);
-    PSession pc = as<CSession>(pcObject, EKind::Session);
-    if (!pcObject || (pc && pc->m_bClosing)) return VI_ERROR_INV_OBJECT;
-    if (!pc) return VI_ERROR_NSUP_OPER;
-    nJob = ++m_nLastJob;
-  }
-  if (pnJob) *pnJob = nJob;
-  ViUInt32 nRet = 0;
-  ViStatus nStatus = write(nVi, pBuf, nCount, &nRet);
-  completeJob(nVi, "viWriteAsync", nJob, nStatus, nRet, const_cast<ViByte *>(pBuf));
-  return VI_SUCCESS_SYNC;
+  return runJob(nVi, "viWriteAsync", const_cast<ViByte *>(pBuf), pnJob,
+                [&](ViUInt32 &nRet) { return write(nVi, pBuf, nCount, &nRet); });
 }
 
 ViStatus CRuntime::terminate(ViObject nVi, ViUInt16 nDegree, ViJobId nJob) {

@@ -23,6 +23,15 @@ bool CRuntime::eventTypeKnown(const CSession &cSession, ViEventType nType) const
          cSession.m_setDeclared.count(nType) > 0;
 }
 
+PSession CRuntime::eventSession(ViSession nVi, ViEventType nType, bool bAllTypes,
+                                ViStatus &nStatus) const {
+  PSession pc = openSession(nVi, VI_ERROR_INV_EVENT, nStatus);
+  if (!pc) return nullptr;
+  if ((bAllTypes && nType == VI_ALL_ENABLED_EVENTS) || eventTypeKnown(*pc, nType)) return pc;
+  nStatus = VI_ERROR_INV_EVENT;
+  return nullptr;
+}
+
 ViStatus CRuntime::createEvent(ViSession nVi, ViEventType nType, ViEvent *pnContext,
                                ViUInt32 *pnMech) {
   if (!pnContext || !pnMech) return VI_ERROR_INV_PARAMETER;
@@ -149,10 +158,9 @@ ViStatus CRuntime::enableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech,
   bool bAsk = false;
   {
     LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-    PObject pcObject = find(nVi);
-    PSession pc = as<CSession>(pcObject, EKind::Session);
-    if (!pcObject || (pc && pc->m_bClosing)) return VI_ERROR_INV_OBJECT;
-    if (!pc || !eventTypeKnown(*pc, nType)) return VI_ERROR_INV_EVENT;
+    ViStatus nStatus = VI_SUCCESS;
+    PSession pc = eventSession(nVi, nType, false, nStatus);
+    if (!pc) return nStatus;
     if (!validMechanism(nMech, false)) return VI_ERROR_INV_MECH;
     // Suspended handlers are not offered by this runtime.
     if (nMech & VI_SUSPEND_HNDLR) return VI_ERROR_NSUP_MECH;
@@ -185,11 +193,9 @@ ViStatus CRuntime::disableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech
   bool bAny = false;
   {
     LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-    PObject pcObject = find(nVi);
-    PSession pc = as<CSession>(pcObject, EKind::Session);
-    if (!pcObject || (pc && pc->m_bClosing)) return VI_ERROR_INV_OBJECT;
-    if (!pc) return VI_ERROR_INV_EVENT;
-    if (nType != VI_ALL_ENABLED_EVENTS && !eventTypeKnown(*pc, nType)) return VI_ERROR_INV_EVENT;
+    ViStatus nStatus = VI_SUCCESS;
+    PSession pc = eventSession(nVi, nType, true, nStatus);
+    if (!pc) return nStatus;
     if (!validMechanism(nMech, true)) return VI_ERROR_INV_MECH;
     // The passport hears only the disable that ends a type, which stops its event source;
     // disabling what is not enabled answers VI_SUCCESS_EVENT_DIS without it.
@@ -218,11 +224,9 @@ ViStatus CRuntime::disableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech
 
 ViStatus CRuntime::discardEvents(ViSession nVi, ViEventType nType, ViUInt16 nMech) {
   LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-  PObject pcObject = find(nVi);
-  PSession pc = as<CSession>(pcObject, EKind::Session);
-  if (!pcObject || (pc && pc->m_bClosing)) return VI_ERROR_INV_OBJECT;
-  if (!pc) return VI_ERROR_INV_EVENT;
-  if (nType != VI_ALL_ENABLED_EVENTS && !eventTypeKnown(*pc, nType)) return VI_ERROR_INV_EVENT;
+  ViStatus nStatus = VI_SUCCESS;
+  PSession pc = eventSession(nVi, nType, true, nStatus);
+  if (!pc) return nStatus;
   if (!validMechanism(nMech, true)) return VI_ERROR_INV_MECH;
   if (!(nMech & VI_QUEUE)) return VI_SUCCESS_QUEUE_EMPTY;
   std::vector<ViEvent> vDiscard;
@@ -238,11 +242,9 @@ ViStatus CRuntime::discardEvents(ViSession nVi, ViEventType nType, ViUInt16 nMec
 ViStatus CRuntime::waitOnEvent(ViSession nVi, ViEventType nType, ViUInt32 nTimeout,
                                ViPEventType pnOutType, ViPEvent pnOutContext) {
   LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-  PObject pcObject = find(nVi);
-  PSession pc = as<CSession>(pcObject, EKind::Session);
-  if (!pcObject || (pc && pc->m_bClosing)) return VI_ERROR_INV_OBJECT;
-  if (!pc) return VI_ERROR_INV_EVENT;
-  if (nType != VI_ALL_ENABLED_EVENTS && !eventTypeKnown(*pc, nType)) return VI_ERROR_INV_EVENT;
+  ViStatus nStatus = VI_SUCCESS;
+  PSession pc = eventSession(nVi, nType, true, nStatus);
+  if (!pc) return nStatus;
   bool bEnabled = false;
   for (auto &sEntry : pc->m_mapEnabled)
     if ((nType == VI_ALL_ENABLED_EVENTS || sEntry.first == nType) && (sEntry.second & VI_QUEUE))
@@ -273,10 +275,9 @@ ViStatus CRuntime::waitOnEvent(ViSession nVi, ViEventType nType, ViUInt32 nTimeo
 ViStatus CRuntime::installHandler(ViSession nVi, ViEventType nType, ViHndlr pfHandler,
                                   ViAddr pUser) {
   LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-  PObject pcObject = find(nVi);
-  PSession pc = as<CSession>(pcObject, EKind::Session);
-  if (!pcObject || (pc && pc->m_bClosing)) return VI_ERROR_INV_OBJECT;
-  if (!pc || !eventTypeKnown(*pc, nType)) return VI_ERROR_INV_EVENT;
+  ViStatus nStatus = VI_SUCCESS;
+  PSession pc = eventSession(nVi, nType, false, nStatus);
+  if (!pc) return nStatus;
   if (!pfHandler) return VI_ERROR_INV_HNDLR_REF;
   pc->m_vHandlers.push_back(SHandler{nType, pfHandler, pUser});
   return VI_SUCCESS;
@@ -285,11 +286,9 @@ ViStatus CRuntime::installHandler(ViSession nVi, ViEventType nType, ViHndlr pfHa
 ViStatus CRuntime::uninstallHandler(ViSession nVi, ViEventType nType, ViHndlr pfHandler,
                                     ViAddr pUser) {
   LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-  PObject pcObject = find(nVi);
-  PSession pc = as<CSession>(pcObject, EKind::Session);
-  if (!pcObject || (pc && pc->m_bClosing)) return VI_ERROR_INV_OBJECT;
-  if (!pc) return VI_ERROR_INV_EVENT;
-  if (nType != VI_ALL_ENABLED_EVENTS && !eventTypeKnown(*pc, nType)) return VI_ERROR_INV_EVENT;
+  ViStatus nStatus = VI_SUCCESS;
+  PSession pc = eventSession(nVi, nType, true, nStatus);
+  if (!pc) return nStatus;
   auto &v = pc->m_vHandlers;
   size_t nBefore = v.size();
   v.erase(std::remove_if(v.begin(), v.end(),

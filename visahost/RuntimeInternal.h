@@ -84,11 +84,9 @@ ViStatus CRuntime::route(ViSession nVi, const char *szOp, bool bNeedsAccess, A..
   F pf = nullptr;
   {
     LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-    PObject pcObject = find(nVi);
-    if (!pcObject) return VI_ERROR_INV_OBJECT;
-    pc = as<CSession>(pcObject, EKind::Session);
-    if (!pc) return VI_ERROR_NSUP_OPER;
-    if (pc->m_bClosing) return VI_ERROR_INV_OBJECT;
+    ViStatus nStatus = VI_SUCCESS;
+    pc = openSession(nVi, VI_ERROR_NSUP_OPER, nStatus);
+    if (!pc) return nStatus;
     if (bNeedsAccess && !accessAllowed(*pc)) return VI_ERROR_RSRC_LOCKED;
     pf = reinterpret_cast<F>(operation(pc->m_pcTable, szOp));
     if (!pf) return VI_ERROR_NSUP_OPER;

@@ -33,10 +33,9 @@ void CRuntime::releaseRsrcLocks(const CSession &c) {
 ViStatus CRuntime::lock(ViSession nVi, ViAccessMode nType, ViUInt32 nTimeout,
                         ViConstKeyId szRequested, ViChar szAccessKey[]) {
   LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-  PObject pcObject = find(nVi);
-  PSession pc = as<CSession>(pcObject, EKind::Session);
-  if (!pcObject || (pc && pc->m_bClosing)) return VI_ERROR_INV_OBJECT;
-  if (!pc) return VI_ERROR_NSUP_OPER;
+  ViStatus nStatus = VI_SUCCESS;
+  PSession pc = openSession(nVi, VI_ERROR_NSUP_OPER, nStatus);
+  if (!pc) return nStatus;
   if (nType != VI_EXCLUSIVE_LOCK && nType != VI_SHARED_LOCK) return VI_ERROR_INV_LOCK_TYPE;
   if (nType == VI_SHARED_LOCK && !szAccessKey) return VI_ERROR_INV_PARAMETER;
   const std::string &strKey = pc->m_strLockKey;
@@ -86,10 +85,9 @@ ViStatus CRuntime::lock(ViSession nVi, ViAccessMode nType, ViUInt32 nTimeout,
 
 ViStatus CRuntime::unlock(ViSession nVi) {
   LbCore::CMutexLock aGuard(g_aRuntimeMutex);
-  PObject pcObject = find(nVi);
-  PSession pc = as<CSession>(pcObject, EKind::Session);
-  if (!pcObject || (pc && pc->m_bClosing)) return VI_ERROR_INV_OBJECT;
-  if (!pc) return VI_ERROR_NSUP_OPER;
+  ViStatus nStatus = VI_SUCCESS;
+  PSession pc = openSession(nVi, VI_ERROR_NSUP_OPER, nStatus);
+  if (!pc) return nStatus;
   auto it = m_mapRsrcLocks.find(pc->m_strLockKey);
   if (it == m_mapRsrcLocks.end()) return VI_ERROR_SESN_NLOCKED;
   SRsrcLock &s = it->second;

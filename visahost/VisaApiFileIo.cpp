@@ -24,6 +24,18 @@ struct SFileCloser {
 };
 using PFile = std::unique_ptr<std::FILE, SFileCloser>;
 
+// The file of a transfer on session vi: opened to be written (viReadToFile; appended when the
+// session asks so) or read (viWriteFromFile). Null with nStatus when the session or the file
+// is not there.
+PFile openFile(ViSession vi, ViConstString filename, bool bToFile, ViStatus &nStatus) {
+  std::shared_ptr<CSessionIo> pc = CSessionIo::of(vi, nStatus);
+  if (!pc) return nullptr;
+  const char *szMode = !bToFile ? "rb" : pc->appendsToFiles() ? "ab" : "wb";
+  PFile pFile(filename ? std::fopen(filename, szMode) : nullptr);
+  if (!pFile) nStatus = VI_ERROR_FILE_ACCESS;
+  return pFile;
+}
+
 }  // namespace
 
 extern "C" {
@@ -32,11 +44,8 @@ ViStatus _VI_FUNC viReadToFile(ViSession vi, ViConstString filename, ViUInt32 cn
                                ViPUInt32 retCnt) {
   if (retCnt) *retCnt = 0;
   ViStatus nStatus = VI_SUCCESS;
-  std::shared_ptr<CSessionIo> pc = CSessionIo::of(vi, nStatus);
-  if (!pc) return nStatus;
-  if (!filename) return VI_ERROR_FILE_ACCESS;
-  PFile pFile(std::fopen(filename, pc->appendsToFiles() ? "ab" : "wb"));
-  if (!pFile) return VI_ERROR_FILE_ACCESS;
+  PFile pFile = openFile(vi, filename, true, nStatus);
+  if (!pFile) return nStatus;
   try {
     std::string strChunk(std::min(cnt, g_nFileChunk), '\0');
     ViUInt32 nDone = 0;
@@ -62,11 +71,8 @@ ViStatus _VI_FUNC viWriteFromFile(ViSession vi, ViConstString filename, ViUInt32
                                   ViPUInt32 retCnt) {
   if (retCnt) *retCnt = 0;
   ViStatus nStatus = VI_SUCCESS;
-  std::shared_ptr<CSessionIo> pc = CSessionIo::of(vi, nStatus);
-  if (!pc) return nStatus;
-  if (!filename) return VI_ERROR_FILE_ACCESS;
-  PFile pFile(std::fopen(filename, "rb"));
-  if (!pFile) return VI_ERROR_FILE_ACCESS;
+  PFile pFile = openFile(vi, filename, false, nStatus);
+  if (!pFile) return nStatus;
   try {
     std::string strData;
     char acBlock[4096];

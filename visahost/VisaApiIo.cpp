@@ -37,100 +37,85 @@ ViStatus withSession(ViSession nVi, F fCall) {
   }
 }
 
-// Runs fCall with a copy of the caller's argument list.
+// Runs fCall on the session's buffers with a copy of the caller's argument list.
 template <typename F>
-ViStatus withArgs(va_list ap, F fCall) {
-  SArgs sArgs;
-  va_copy(sArgs.m_ap, ap);
-  ViStatus nStatus = fCall(sArgs);
-  va_end(sArgs.m_ap);
-  return nStatus;
+ViStatus withSessionArgs(ViSession nVi, va_list ap, F fCall) {
+  return withSession(nVi, [&](CSessionIo &c) {
+    SArgs sArgs;
+    va_copy(sArgs.m_ap, ap);
+    ViStatus nStatus = fCall(c, sArgs);
+    va_end(sArgs.m_ap);
+    return nStatus;
+  });
 }
 
 }  // namespace
 
+// A variadic entry point hands its arguments to its va_list twin CALL, which names the list AP.
+// va_start and va_end must stand in the variadic function itself, hence a macro.
+#define LB_FORWARD_VARARGS(LAST, AP, CALL) \
+  va_list AP;                              \
+  va_start(AP, LAST);                      \
+  const ViStatus nStatus = CALL;           \
+  va_end(AP);                              \
+  return nStatus
+
 extern "C" {
 
 ViStatus _VI_FUNC viVPrintf(ViSession vi, ViConstString writeFmt, ViVAList params) {
-  return withSession(vi, [&](CSessionIo &c) {
-    return withArgs(params, [&](SArgs &sArgs) { return c.print(writeFmt, sArgs); });
-  });
+  return withSessionArgs(vi, params,
+                         [&](CSessionIo &c, SArgs &sArgs) { return c.print(writeFmt, sArgs); });
 }
 
 ViStatus _VI_FUNCC viPrintf(ViSession vi, ViConstString writeFmt, ...) {
-  va_list ap;
-  va_start(ap, writeFmt);
-  ViStatus nStatus = viVPrintf(vi, writeFmt, ap);
-  va_end(ap);
-  return nStatus;
+  LB_FORWARD_VARARGS(writeFmt, ap, viVPrintf(vi, writeFmt, ap));
 }
 
 ViStatus _VI_FUNC viVSPrintf(ViSession vi, ViPBuf buf, ViConstString writeFmt, ViVAList parms) {
   if (!buf) return VI_ERROR_USER_BUF;
-  return withSession(vi, [&](CSessionIo &) {
-    return withArgs(parms, [&](SArgs &sArgs) -> ViStatus {
-      std::string strOut;
-      ViStatus nStatus = LbVisaHost::formatOutput(writeFmt, sArgs, strOut);
-      if (nStatus < VI_SUCCESS) return nStatus;
-      std::memcpy(buf, strOut.c_str(), strOut.size() + 1);
-      return VI_SUCCESS;
-    });
+  return withSessionArgs(vi, parms, [&](CSessionIo &, SArgs &sArgs) -> ViStatus {
+    std::string strOut;
+    ViStatus nStatus = LbVisaHost::formatOutput(writeFmt, sArgs, strOut);
+    if (nStatus < VI_SUCCESS) return nStatus;
+    std::memcpy(buf, strOut.c_str(), strOut.size() + 1);
+    return VI_SUCCESS;
   });
 }
 
 ViStatus _VI_FUNCC viSPrintf(ViSession vi, ViPBuf buf, ViConstString writeFmt, ...) {
-  va_list ap;
-  va_start(ap, writeFmt);
-  ViStatus nStatus = viVSPrintf(vi, buf, writeFmt, ap);
-  va_end(ap);
-  return nStatus;
+  LB_FORWARD_VARARGS(writeFmt, ap, viVSPrintf(vi, buf, writeFmt, ap));
 }
 
 ViStatus _VI_FUNC viVScanf(ViSession vi, ViConstString readFmt, ViVAList params) {
-  return withSession(vi, [&](CSessionIo &c) {
-    return withArgs(params, [&](SArgs &sArgs) { return c.scan(readFmt, sArgs); });
-  });
+  return withSessionArgs(vi, params,
+                         [&](CSessionIo &c, SArgs &sArgs) { return c.scan(readFmt, sArgs); });
 }
 
 ViStatus _VI_FUNCC viScanf(ViSession vi, ViConstString readFmt, ...) {
-  va_list ap;
-  va_start(ap, readFmt);
-  ViStatus nStatus = viVScanf(vi, readFmt, ap);
-  va_end(ap);
-  return nStatus;
+  LB_FORWARD_VARARGS(readFmt, ap, viVScanf(vi, readFmt, ap));
 }
 
 ViStatus _VI_FUNC viVSScanf(ViSession vi, ViConstBuf buf, ViConstString readFmt, ViVAList parms) {
   if (!buf) return VI_ERROR_USER_BUF;
-  return withSession(vi, [&](CSessionIo &) {
-    return withArgs(parms, [&](SArgs &sArgs) {
-      CStringInput cInput(buf);
-      return LbVisaHost::scanInput(readFmt, sArgs, cInput);
-    });
+  return withSessionArgs(vi, parms, [&](CSessionIo &, SArgs &sArgs) {
+    CStringInput cInput(buf);
+    return LbVisaHost::scanInput(readFmt, sArgs, cInput);
   });
 }
 
 ViStatus _VI_FUNCC viSScanf(ViSession vi, ViConstBuf buf, ViConstString readFmt, ...) {
-  va_list ap;
-  va_start(ap, readFmt);
-  ViStatus nStatus = viVSScanf(vi, buf, readFmt, ap);
-  va_end(ap);
-  return nStatus;
+  LB_FORWARD_VARARGS(readFmt, ap, viVSScanf(vi, buf, readFmt, ap));
 }
 
 ViStatus _VI_FUNC viVQueryf(ViSession vi, ViConstString writeFmt, ViConstString readFmt,
                             ViVAList params) {
-  return withSession(vi, [&](CSessionIo &c) {
-    return withArgs(params, [&](SArgs &sArgs) { return c.query(writeFmt, readFmt, sArgs); });
+  return withSessionArgs(vi, params, [&](CSessionIo &c, SArgs &sArgs) {
+    return c.query(writeFmt, readFmt, sArgs);
   });
 }
 
 ViStatus _VI_FUNCC viQueryf(ViSession vi, ViConstString writeFmt, ViConstString readFmt, ...) {
-  va_list ap;
-  va_start(ap, readFmt);
-  ViStatus nStatus = viVQueryf(vi, writeFmt, readFmt, ap);
-  va_end(ap);
-  return nStatus;
+  LB_FORWARD_VARARGS(readFmt, ap, viVQueryf(vi, writeFmt, readFmt, ap));
 }
 
 ViStatus _VI_FUNC viFlush(ViSession vi, ViUInt16 mask) {
@@ -154,6 +139,5 @@ ViStatus _VI_FUNC viBufWrite(ViSession vi, ViConstBuf buf, ViUInt32 cnt, ViPUInt
 ViStatus _VI_FUNC viBufRead(ViSession vi, ViPBuf buf, ViUInt32 cnt, ViPUInt32 retCnt) {
   return withSession(vi, [&](CSessionIo &c) { return c.bufRead(buf, cnt, retCnt); });
 }
-
 
 }  // extern "C"

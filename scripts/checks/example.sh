@@ -5,34 +5,6 @@
 # other build folders.
 set -uo pipefail
 cd "$(dirname "$0")/../.."
-export WINEDEBUG=-all
-export WINEPREFIX="${WINEPREFIX:-$PWD/build/wineprefix}"
-# The embedded defaults: the passport beside the runtime, the two default simulated sensors.
-unset LBVISA_PASSPORTS PMXSIM_DEVICES
-
-dev=${LB_DEV_BUILD_DIR:-build/dev}
-mingw=${LB_MINGW_BUILD_DIR:-build/mingw}
-status=0
-run() {  # name, command...
-  local name=$1 log rc; shift
-  log=$(mktemp)
-  timeout 300 "$@" >"$log" 2>&1
-  rc=$?
-  if [ $rc -ne 0 ]; then
-    echo "$name: FAILED (exit $rc)"; cat "$log"; status=1
-  elif ! grep -qE "^  Measured power: -?[0-9]+\.[0-9]+ dBm" "$log" \
-       || ! grep -qE "^  Trace received: [1-9][0-9]* points" "$log"; then
-    echo "$name: FAILED (no measurement in the output)"; cat "$log"; status=1
-  else
-    echo "$name: $(grep -E '^  Measured power' "$log" | sed 's/^ *//'), $(grep -E '^  Trace received' "$log" | sed 's/^ *//')"
-  fi
-  rm -f "$log"
-}
-
-for exe in "$dev/bin/lbpmx-measure" "$mingw/bin/lbpmx-measure.exe"; do
-  [ -f "$exe" ] || { echo "missing $exe"; status=1; }
-done
-[ $status -eq 0 ] || exit 1
-run native "$dev/bin/lbpmx-measure"
-run wine wine "$mingw/bin/lbpmx-measure.exe"
-exit $status
+. scripts/checks/lib/run-example.sh
+run_example lbpmx-measure "^  Measured power: -?[0-9]+\.[0-9]+ dBm" \
+    "^  Trace received: [1-9][0-9]* points"

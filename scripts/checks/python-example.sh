@@ -5,12 +5,8 @@
 # LB_DEV_BUILD_DIR chooses another build folder.
 set -uo pipefail
 cd "$(dirname "$0")/../.."
-dev=${LB_DEV_BUILD_DIR:-build/dev}
-# The embedded defaults: the passport beside the runtime, the two default simulated sensors.
-unset LBVISA_PASSPORTS PMXSIM_DEVICES PMXSIM_CONFIG
-lib="$PWD/$dev/bin/libvisa.so"
-[ -f "$lib" ] || { echo "missing $lib"; exit 1; }
-[ -f "$PWD/$dev/bin/LbViPmx64.so" ] || { echo "missing $PWD/$dev/bin/LbViPmx64.so"; exit 1; }
+. scripts/checks/lib/native-visa.sh
+unset PMXSIM_CONFIG
 export PYVISA_LIBRARY="$lib" PYTHONDONTWRITEBYTECODE=1
 timeout 300 /usr/bin/python3 -m pytest -q -p no:cacheprovider examples/python \
     tests/pmxsim/test_pmxsim_module.py
