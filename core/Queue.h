@@ -81,12 +81,12 @@ public:
     }
 
 private:
-    std::deque<T*> m_cEntries;
+    std::deque<T*> m_cEntries GUARDED_BY(m_cLock);
     mutable CCriticalSection m_cLock;
     CSemaphore m_cFree;
     CSemaphore m_cItems;
-    std::uint64_t m_nCount;
-    std::uint64_t m_nInterrupts;
+    std::uint64_t m_nCount GUARDED_BY(m_cLock);
+    std::uint64_t m_nInterrupts GUARDED_BY(m_cLock);
 };
 
 } // namespace LbCore

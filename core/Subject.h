@@ -52,7 +52,7 @@ public:
 protected:
     std::atomic<bool> m_bNotify;
     CCriticalSection m_cLock;
-    std::vector<T*> m_cObservers;
+    std::vector<T*> m_cObservers GUARDED_BY(m_cLock);
 };
 
 template <class T, class Signature>

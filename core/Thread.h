@@ -73,7 +73,7 @@ private:
     CIRunnable* m_pcRunnable;
     void* m_hThread;
     std::uint32_t m_nThreadId;
-    int m_nState;
+    int m_nState GUARDED_BY(m_cStateLock);
     CSemaphore m_cStarted;
     CSemaphore m_cFinished;
     CSemaphore m_cStopHandshake;
