@@ -48,59 +48,59 @@ bool read(ViSession vi, std::vector<ViByte>& buffer, ViUInt32 minimum = 1)
     return viRead(vi, buffer.data(), static_cast<ViUInt32>(buffer.size()), &count) == VI_SUCCESS && count >= minimum;
 }
 
-#define LB_REQUIRE(state, condition)                                                                                   \
-    if (!(condition)) {                                                                                                \
-        (state).SkipWithError("failed: " #condition);                                                                  \
-        break;                                                                                                         \
-    }
-
-void BM_AcknowledgedWrite(benchmark::State& state)
+// A failed condition ends the run with its text; true when it held.
+bool require(benchmark::State& state, bool held, const char* failure)
 {
-    CSession session(0);
+    if (!held) {
+        state.SkipWithError(failure);
+    }
+    return held;
+}
+#define LB_REQUIRE(state, condition) require(state, (condition), "failed: " #condition)
+
+// One measurement: trigger, fetch and read an answer of at least `minimum` bytes.
+bool triggerFetchRead(benchmark::State& state, ViSession vi, std::vector<ViByte>& buffer, ViUInt32 minimum = 1)
+{
+    return LB_REQUIRE(state, viAssertTrigger(vi, VI_TRIG_PROT_DEFAULT) == VI_SUCCESS) &&
+           LB_REQUIRE(state, write(vi, "FETCh?")) && LB_REQUIRE(state, read(vi, buffer, minimum));
+}
+
+// Times `step` (true when it succeeded) once per iteration on a session of `sensor`, counting
+// the allocations; a failed step ends the run.
+template <class TStep>
+void timeSteps(benchmark::State& state, int sensor, TStep step)
+{
+    CSession session(sensor);
     if (!session.isOpen()) {
         state.SkipWithError("viOpen failed");
         return;
     }
     COperationCounters counters;
     for (auto _ : state) {
-        LB_REQUIRE(state, write(session, "FUNC POWER"));
+        if (!step(session)) break;
     }
     counters.report(state);
+}
+
+void BM_AcknowledgedWrite(benchmark::State& state)
+{
+    timeSteps(state, 0, [&](ViSession vi) { return LB_REQUIRE(state, write(vi, "FUNC POWER")); });
 }
 BENCHMARK(BM_AcknowledgedWrite)->UseRealTime();
 
 void BM_IdnQuery(benchmark::State& state)
 {
-    CSession session(0);
     std::vector<ViByte> buffer(256);
-    if (!session.isOpen()) {
-        state.SkipWithError("viOpen failed");
-        return;
-    }
-    COperationCounters counters;
-    for (auto _ : state) {
-        LB_REQUIRE(state, write(session, "*IDN?"));
-        LB_REQUIRE(state, read(session, buffer));
-    }
-    counters.report(state);
+    timeSteps(state, 0, [&](ViSession vi) {
+        return LB_REQUIRE(state, write(vi, "*IDN?")) && LB_REQUIRE(state, read(vi, buffer));
+    });
 }
 BENCHMARK(BM_IdnQuery)->UseRealTime();
 
 void BM_TriggerFetchRead(benchmark::State& state)
 {
-    CSession session(0);
     std::vector<ViByte> buffer(256);
-    if (!session.isOpen()) {
-        state.SkipWithError("viOpen failed");
-        return;
-    }
-    COperationCounters counters;
-    for (auto _ : state) {
-        LB_REQUIRE(state, viAssertTrigger(session, VI_TRIG_PROT_DEFAULT) == VI_SUCCESS);
-        LB_REQUIRE(state, write(session, "FETCh?"));
-        LB_REQUIRE(state, read(session, buffer));
-    }
-    counters.report(state);
+    timeSteps(state, 0, [&](ViSession vi) { return triggerFetchRead(state, vi, buffer); });
 }
 BENCHMARK(BM_TriggerFetchRead)->UseRealTime();
 
@@ -116,9 +116,7 @@ void BM_Trace1024(benchmark::State& state)
     }
     COperationCounters counters;
     for (auto _ : state) {
-        LB_REQUIRE(state, viAssertTrigger(session, VI_TRIG_PROT_DEFAULT) == VI_SUCCESS);
-        LB_REQUIRE(state, write(session, "FETCh?"));
-        LB_REQUIRE(state, read(session, buffer, 4 * 1024));
+        if (!triggerFetchRead(state, session, buffer, 4 * 1024)) break;
     }
     counters.report(state);
     write(session, "*RST");
@@ -127,17 +125,10 @@ BENCHMARK(BM_Trace1024)->UseRealTime();
 
 void BM_ReadSTB(benchmark::State& state)
 {
-    CSession session(0);
-    if (!session.isOpen()) {
-        state.SkipWithError("viOpen failed");
-        return;
-    }
-    COperationCounters counters;
-    for (auto _ : state) {
+    timeSteps(state, 0, [&](ViSession vi) {
         ViUInt16 status = 0;
-        LB_REQUIRE(state, viReadSTB(session, &status) == VI_SUCCESS);
-    }
-    counters.report(state);
+        return LB_REQUIRE(state, viReadSTB(vi, &status) == VI_SUCCESS);
+    });
 }
 BENCHMARK(BM_ReadSTB)->UseRealTime();
 
@@ -149,11 +140,11 @@ void BM_OpenSession(benchmark::State& state)
     COperationCounters counters;
     for (auto _ : state) {
         ViSession vi = VI_NULL;
-        LB_REQUIRE(state, viOpen(resourceManager(), sensorName(0).c_str(), VI_NULL, 0, &vi) == VI_SUCCESS);
+        if (!LB_REQUIRE(state, viOpen(resourceManager(), sensorName(0).c_str(), VI_NULL, 0, &vi) == VI_SUCCESS)) break;
         state.PauseTiming();
         ViStatus closed = viClose(vi);
         state.ResumeTiming();
-        LB_REQUIRE(state, closed == VI_SUCCESS);
+        if (!LB_REQUIRE(state, closed == VI_SUCCESS)) break;
     }
     counters.report(state);
 }
@@ -168,7 +159,7 @@ void BM_WritesOnSensors(benchmark::State& state)
         return;
     }
     for (auto _ : state) {
-        LB_REQUIRE(state, write(session, "FUNC POWER"));
+        if (!LB_REQUIRE(state, write(session, "FUNC POWER"))) break;
     }
     state.SetItemsProcessed(state.iterations());
 }
@@ -214,11 +205,8 @@ void BM_SrqCycle(benchmark::State& state)
     unsigned long expected = 0;
     COperationCounters counters;
     for (auto _ : state) {
-        LB_REQUIRE(state, viAssertTrigger(session, VI_TRIG_PROT_DEFAULT) == VI_SUCCESS);
-        LB_REQUIRE(state, write(session, "FETCh?"));
-        LB_REQUIRE(state, read(session, buffer));
         expected += kRequestsPerCycle;
-        LB_REQUIRE(state, counter.waitFor(expected));
+        if (!triggerFetchRead(state, session, buffer) || !LB_REQUIRE(state, counter.waitFor(expected))) break;
     }
     counters.report(state);
     viDisableEvent(session, VI_EVENT_SERVICE_REQ, VI_HNDLR);

@@ -35,7 +35,8 @@ enum EAction {
     eAveraging, // [SENS:]AVER[:STAT]
     eOffset, // [SENS:]CORR:OFFS
     eUnit, // UNIT:POW
-    eVersion // SYST:VERS?
+    eVersion, // SYST:VERS?
+    eFormat // FORM[:DATA]?: the format of the results
 };
 
 // The choices of FUNC and UNIT:POW, as nValue.

@@ -205,8 +205,24 @@ private:
         SensorPtr m_pSensor;
     };
 
+    // The lock for the scope, for the functions that are not library calls.
+    class SCOPED_CAPABILITY CLock {
+    public:
+        explicit CLock(CSimulator& sim) ACQUIRE(sim.m_aMutex);
+        ~CLock() RELEASE();
+        CLock(const CLock&) = delete;
+        CLock& operator=(const CLock&) = delete;
+
+    private:
+        CSimulator& m_rSim;
+    };
+
     CSimulator();
 
+    // Every holder but the worker releases the lock through this: it wakes the worker once the
+    // lock is free when work was posted or scheduled under it (woken under the lock, the worker
+    // would only block on it at once).
+    void unlockAndWake() RELEASE(m_aMutex);
     static void workerMain(void* arg);
     void run(uint64_t generation) EXCLUDES(m_aMutex);
     // Stops the worker with the lock held; the worker is joined (or detached) by the caller after
@@ -250,6 +266,7 @@ private:
 
     LbCore::CMutex m_aMutex;
     std::condition_variable_any m_aWorkChanged; // wakes the worker
+    bool m_bWakeWorker GUARDED_BY(m_aMutex) = false; // work changed under the lock: wake it
     std::condition_variable_any m_aDeliveryChanged; // wakes registrations waiting for a delivery
 
     bool m_bDriverOpen GUARDED_BY(m_aMutex) = false;

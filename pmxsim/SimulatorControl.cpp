@@ -67,7 +67,7 @@ int32_t CSimulator::reset()
 {
     SWorker* worker;
     {
-        LbCore::CMutexLock lock(m_aMutex);
+        CLock lock(*this);
         worker = stopDriverLocked();
         for (SCallback& callback : m_aCallbacks)
             callback = SCallback();
@@ -81,7 +81,7 @@ int32_t CSimulator::reset()
 
 int32_t CSimulator::attach(const char* type, const char* serial)
 {
-    LbCore::CMutexLock lock(m_aMutex);
+    CLock lock(*this);
     if (!validText(type) || !validText(serial))
         return PMXSIM_E_INVALID_ARGUMENT;
     if (findAttached(serial))
@@ -96,7 +96,7 @@ int32_t CSimulator::attach(const char* type, const char* serial)
 
 int32_t CSimulator::detach(const char* serial)
 {
-    LbCore::CMutexLock lock(m_aMutex);
+    CLock lock(*this);
     if (serial == nullptr)
         return PMXSIM_E_INVALID_ARGUMENT;
     auto it = std::find_if(m_aSensors.begin(), m_aSensors.end(),
@@ -120,7 +120,7 @@ void CSimulator::detachLocked(SensorPtr sensor)
 
 int32_t CSimulator::setDeviceFlag(const char* serial, int32_t flag)
 {
-    LbCore::CMutexLock lock(m_aMutex);
+    CLock lock(*this);
     if (serial == nullptr)
         return PMXSIM_E_INVALID_ARGUMENT;
     SensorPtr sensor = findAttached(serial);
@@ -134,7 +134,7 @@ int32_t CSimulator::setDeviceFlag(const char* serial, int32_t flag)
 int32_t CSimulator::queueResult(
     const char* serial, int32_t dataType, const void* values, int32_t count)
 {
-    LbCore::CMutexLock lock(m_aMutex);
+    CLock lock(*this);
     if (dataType < 0 || dataType > PMXSIM_TYPE_LAST || count < 0 || count > kMaxQueuedCount
         || (count > 0 && values == nullptr))
         return PMXSIM_E_INVALID_ARGUMENT;
@@ -173,7 +173,7 @@ int32_t CSimulator::queueResult(
 
 int32_t CSimulator::reportError(const char* serial, int32_t code)
 {
-    LbCore::CMutexLock lock(m_aMutex);
+    CLock lock(*this);
     int64_t handle = 0;
     if (serial != nullptr && *serial != '\0') {
         int32_t result;
@@ -188,7 +188,7 @@ int32_t CSimulator::reportError(const char* serial, int32_t code)
 
 int32_t CSimulator::setTriggerState(const char* serial, int32_t state)
 {
-    LbCore::CMutexLock lock(m_aMutex);
+    CLock lock(*this);
     int32_t code;
     SensorPtr sensor = findOpenBySerial(serial, &code);
     if (!sensor)
@@ -199,7 +199,7 @@ int32_t CSimulator::setTriggerState(const char* serial, int32_t state)
 
 int32_t CSimulator::getLastCommand(const char* serial, char* text, int32_t size, int32_t* timeout)
 {
-    LbCore::CMutexLock lock(m_aMutex);
+    CLock lock(*this);
     int32_t code;
     SensorPtr sensor = findOpenBySerial(serial, &code);
     if (!sensor)
@@ -215,7 +215,7 @@ int32_t CSimulator::getLastCommand(const char* serial, char* text, int32_t size,
 
 int32_t CSimulator::setDelays(int32_t ackMs, int32_t measureMs)
 {
-    LbCore::CMutexLock lock(m_aMutex);
+    CLock lock(*this);
     if (ackMs < 0 || measureMs < 0)
         return PMXSIM_E_INVALID_ARGUMENT;
     m_nAckMs = ackMs;
@@ -225,14 +225,14 @@ int32_t CSimulator::setDelays(int32_t ackMs, int32_t measureMs)
 
 int32_t CSimulator::setAutoAck(int32_t on)
 {
-    LbCore::CMutexLock lock(m_aMutex);
+    CLock lock(*this);
     m_bAutoAck = on != 0;
     return PMX_SUCCESS;
 }
 
 int32_t CSimulator::failNext(const char* function, int32_t code)
 {
-    LbCore::CMutexLock lock(m_aMutex);
+    CLock lock(*this);
     if (function == nullptr)
         return PMXSIM_E_INVALID_ARGUMENT;
     for (int fn = 0; fn < eFunctionCount; ++fn) {

@@ -32,7 +32,7 @@ CSimulator& CSimulator::instance()
 
 CSimulator::CSimulator()
 {
-    LbCore::CMutexLock lock(m_aMutex);
+    CLock lock(*this);
     m_nNextHandle = kFirstHandle;
     m_aRandom.seed(12345);
     loadDefaultsLocked();
@@ -45,7 +45,7 @@ void CSimulator::shutdownAtUnload()
     CSimulator& sim = instance();
     SWorker* worker;
     {
-        LbCore::CMutexLock lock(sim.m_aMutex);
+        CLock lock(sim);
         worker = sim.stopDriverLocked();
     }
     sim.finishStop(worker);
@@ -65,7 +65,27 @@ CSimulator::CCall::CCall(CSimulator& sim, EFunction fn, ENeed need, int64_t hand
 
 CSimulator::CCall::~CCall()
 {
-    m_rSim.m_aMutex.unlock();
+    m_rSim.unlockAndWake();
+}
+
+CSimulator::CLock::CLock(CSimulator& sim)
+    : m_rSim(sim)
+{
+    sim.m_aMutex.lock();
+}
+
+CSimulator::CLock::~CLock()
+{
+    m_rSim.unlockAndWake();
+}
+
+void CSimulator::unlockAndWake()
+{
+    bool wake = m_bWakeWorker;
+    m_bWakeWorker = false;
+    m_aMutex.unlock();
+    if (wake)
+        m_aWorkChanged.notify_all();
 }
 
 // Counts the call; a failure injected with PmxSimFailNext comes first, then a failure the
@@ -154,7 +174,7 @@ SWorker* CSimulator::stopDriverLocked()
     m_aTasks.clear();
     SWorker* worker = m_pWorker;
     m_pWorker = nullptr;
-    m_aWorkChanged.notify_all();
+    m_bWakeWorker = true; // to see that its generation ended
     return worker;
 }
 
@@ -169,7 +189,7 @@ void CSimulator::finishStop(SWorker* worker)
     }
     if (worker != nullptr)
         joinWorker(worker);
-    LbCore::CMutexLock lock(m_aMutex);
+    CLock lock(*this);
     waitForAllDeliveriesLocked();
 }
 
@@ -223,6 +243,7 @@ void CSimulator::run(uint64_t generation)
         STask task = std::move(first->second);
         m_aTasks.erase(first);
         runTask(task, now);
+        m_bWakeWorker = false; // what the task posted or scheduled, this loop sees next
     }
     m_aMutex.unlock();
 }
@@ -233,13 +254,13 @@ void CSimulator::post(ECallback kind, int64_t handle, int32_t value)
     if (!m_bDriverOpen)
         return;
     m_aOutbox.push_back(SEvent{ kind, handle, value });
-    m_aWorkChanged.notify_all();
+    m_bWakeWorker = true;
 }
 
 void CSimulator::schedule(Clock::time_point due, STask task)
 {
     m_aTasks.emplace(std::make_pair(due, m_nTaskSequence++), std::move(task));
-    m_aWorkChanged.notify_all();
+    m_bWakeWorker = true;
 }
 
 // ---- callback registrations ----

@@ -137,29 +137,20 @@ protected:
         return handle;
     }
     // Sends a command and waits for its acknowledgement.
-    void command(int64_t handle, const char* text)
-    {
-        size_t before = 0;
-        for (const SCall& c : m_aRecorder.calls())
-            if (c.kind == eAccepted && c.handle == handle)
-                ++before;
-        ASSERT_EQ(0, PmxSendCommand(handle, text, 0));
-        ASSERT_TRUE(m_aRecorder.waitFor(
-            [&](const SCall& c) { return c.kind == eAccepted && c.handle == handle; }, before + 1))
-            << text;
-    }
+    void command(int64_t handle, const char* text) { sendAndWait(handle, text, eAccepted); }
     // Sends a command and waits for its next result; the oldest pending result stays for the
     // caller to take.
-    void awaitResult(int64_t handle, const char* text)
+    void awaitResult(int64_t handle, const char* text) { sendAndWait(handle, text, eData); }
+    // Sends a command and waits for the next callback of `kind` for the handle.
+    void sendAndWait(int64_t handle, const char* text, EKind kind)
     {
+        auto matches = [&](const SCall& c) { return c.kind == kind && c.handle == handle; };
         size_t before = 0;
         for (const SCall& c : m_aRecorder.calls())
-            if (c.kind == eData && c.handle == handle)
+            if (matches(c))
                 ++before;
         ASSERT_EQ(0, PmxSendCommand(handle, text, 0));
-        ASSERT_TRUE(m_aRecorder.waitFor(
-            [&](const SCall& c) { return c.kind == eData && c.handle == handle; }, before + 1))
-            << text;
+        ASSERT_TRUE(m_aRecorder.waitFor(matches, before + 1)) << text;
     }
     std::string ask(int64_t handle, const char* text)
     {

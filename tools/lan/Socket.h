@@ -1,6 +1,6 @@
 // The operating-system side of the gateway's TCP plumbing, one implementation per platform
-// (Socket_posix.cpp: BSD sockets; Socket_win32.cpp: Winsock). Sockets are plain handles; every
-// call retries interruptions itself.
+// (Socket_posix.cpp: BSD sockets; Socket_win32.cpp: Winsock; SocketAddress.cpp: the address
+// texts, common to both). Sockets are plain handles; every call retries interruptions itself.
 #ifndef LBPMX_LAN_SOCKET_H
 #define LBPMX_LAN_SOCKET_H
 

@@ -25,23 +25,6 @@ bool socketStartup()
     return true;
 }
 
-bool parseIpv4(const std::string& text, std::uint32_t& address)
-{
-    in_addr a;
-    if (inet_pton(AF_INET, text.c_str(), &a) != 1) return false;
-    address = ntohl(a.s_addr);
-    return true;
-}
-
-std::string ipv4Text(std::uint32_t address)
-{
-    in_addr a;
-    a.s_addr = htonl(address);
-    char text[INET_ADDRSTRLEN] = "?";
-    inet_ntop(AF_INET, &a, text, sizeof text);
-    return text;
-}
-
 TSocket socketListen(const std::string& address, unsigned port, unsigned& boundPort, std::string& error)
 {
     int fd = ::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0);

@@ -26,23 +26,6 @@ bool socketStartup()
     return WSAStartup(MAKEWORD(2, 2), &data) == 0;
 }
 
-bool parseIpv4(const std::string& text, std::uint32_t& address)
-{
-    in_addr a;
-    if (inet_pton(AF_INET, text.c_str(), &a) != 1) return false;
-    address = ntohl(a.s_addr);
-    return true;
-}
-
-std::string ipv4Text(std::uint32_t address)
-{
-    in_addr a;
-    a.s_addr = htonl(address);
-    char text[INET_ADDRSTRLEN] = "?";
-    inet_ntop(AF_INET, &a, text, sizeof text);
-    return text;
-}
-
 TSocket socketListen(const std::string& address, unsigned port, unsigned& boundPort, std::string& error)
 {
     SOCKET s = ::socket(AF_INET, SOCK_STREAM, IPPROTO_TCP);

@@ -18,17 +18,13 @@ xdrproc_t xdrProc(TProc proc)
     return reinterpret_cast<xdrproc_t>(reinterpret_cast<void (*)()>(proc));
 }
 
-// Encodes a reply message (header and results) as one record.
-bool encodeReply(const rpc_msg& msg, std::vector<std::uint8_t>& out)
+// Ends a record encoded by `x` behind the 4 bytes reserved at the front of `out`: trims `out`
+// to what was encoded and writes the record mark there. A failed encoding leaves `out` empty.
+bool finishRecord(XDR& x, bool encoded, std::vector<std::uint8_t>& out)
 {
-    unsigned long size = xdr_sizeof(xdrProc(xdr_replymsg), const_cast<rpc_msg*>(&msg));
-    out.assign(4 + size, 0);
-    XDR x;
-    xdrmem_create(&x, reinterpret_cast<char*>(out.data()) + 4, size, XDR_ENCODE);
-    bool ok = xdr_replymsg(&x, const_cast<rpc_msg*>(&msg));
     std::uint32_t used = xdr_getpos(&x);
     xdr_destroy(&x);
-    if (!ok) {
+    if (!encoded) {
         out.clear();
         return false;
     }
@@ -38,6 +34,16 @@ bool encodeReply(const rpc_msg& msg, std::vector<std::uint8_t>& out)
         out[i] = static_cast<std::uint8_t>(header >> (24 - 8 * i));
     }
     return true;
+}
+
+// Encodes a reply message (header and results) as one record.
+bool encodeReply(const rpc_msg& msg, std::vector<std::uint8_t>& out)
+{
+    unsigned long size = xdr_sizeof(xdrProc(xdr_replymsg), const_cast<rpc_msg*>(&msg));
+    out.assign(4 + size, 0);
+    XDR x;
+    xdrmem_create(&x, reinterpret_cast<char*>(out.data()) + 4, size, XDR_ENCODE);
+    return finishRecord(x, xdr_replymsg(&x, const_cast<rpc_msg*>(&msg)), out);
 }
 
 rpc_msg acceptedReply(std::uint32_t xid, accept_stat stat)
@@ -86,6 +92,19 @@ bool withArgs(XDR& x, std::uint32_t xid, bool_t (*decode)(XDR*, TArgs*), std::ve
     return ok;
 }
 
+// Decodes the arguments, lets `fill` set a zeroed result from them and answers with that result.
+template <class TArgs, class TResult, class TFill>
+bool answer(XDR& x, std::uint32_t xid, bool_t (*decode)(XDR*, TArgs*), bool_t (*encode)(XDR*, TResult*),
+            std::vector<std::uint8_t>& out, TFill fill)
+{
+    return withArgs(x, xid, decode, out, [&](TArgs& args) {
+        TResult result;
+        std::memset(&result, 0, sizeof result);
+        fill(args, result);
+        replyResult(xid, xdrProc(encode), &result, out);
+    });
+}
+
 bool dispatchCore(XDR& x, std::uint32_t xid, std::uint32_t proc, CIVxi11Device& device,
                   std::vector<std::uint8_t>& out)
 {
@@ -93,34 +112,23 @@ bool dispatchCore(XDR& x, std::uint32_t xid, std::uint32_t proc, CIVxi11Device& 
     case 0: // NULLPROC: a ping
         return replyResult(xid, xdrProc(xdr_void), 0, out);
     case create_link:
-        return withArgs(x, xid, xdr_Create_LinkParms, out, [&](Create_LinkParms& a) {
-            Create_LinkResp r;
-            std::memset(&r, 0, sizeof r);
-            device.createLink(a, r);
-            replyResult(xid, xdrProc(xdr_Create_LinkResp), &r, out);
-        });
+        return answer(x, xid, xdr_Create_LinkParms, xdr_Create_LinkResp, out,
+                      [&](Create_LinkParms& a, Create_LinkResp& r) { device.createLink(a, r); });
     case device_write:
-        return withArgs(x, xid, xdr_Device_WriteParms, out, [&](Device_WriteParms& a) {
-            Device_WriteResp r = {0, 0};
-            r.error = device.write(a, r.size);
-            replyResult(xid, xdrProc(xdr_Device_WriteResp), &r, out);
-        });
-    case device_read:
-        return withArgs(x, xid, xdr_Device_ReadParms, out, [&](Device_ReadParms& a) {
-            std::string data;
-            Device_ReadResp r;
-            std::memset(&r, 0, sizeof r);
-            r.error = device.read(a, data, r.reason);
-            r.data.data_len = static_cast<u_int>(data.size());
-            r.data.data_val = data.empty() ? 0 : &data[0];
-            replyResult(xid, xdrProc(xdr_Device_ReadResp), &r, out);
-        });
+        return answer(x, xid, xdr_Device_WriteParms, xdr_Device_WriteResp, out,
+                      [&](Device_WriteParms& a, Device_WriteResp& r) { r.error = device.write(a, r.size); });
+    case device_read: {
+        std::string data; // the reply points into it until it is encoded
+        return answer(x, xid, xdr_Device_ReadParms, xdr_Device_ReadResp, out,
+                      [&](Device_ReadParms& a, Device_ReadResp& r) {
+                          r.error = device.read(a, data, r.reason);
+                          r.data.data_len = static_cast<u_int>(data.size());
+                          r.data.data_val = data.empty() ? 0 : &data[0];
+                      });
+    }
     case device_readstb:
-        return withArgs(x, xid, xdr_Device_GenericParms, out, [&](Device_GenericParms& a) {
-            Device_ReadStbResp r = {0, 0};
-            r.error = device.readStb(a, r.stb);
-            replyResult(xid, xdrProc(xdr_Device_ReadStbResp), &r, out);
-        });
+        return answer(x, xid, xdr_Device_GenericParms, xdr_Device_ReadStbResp, out,
+                      [&](Device_GenericParms& a, Device_ReadStbResp& r) { r.error = device.readStb(a, r.stb); });
     case device_trigger:
     case device_clear:
     case device_remote:
@@ -144,12 +152,8 @@ bool dispatchCore(XDR& x, std::uint32_t xid, std::uint32_t proc, CIVxi11Device& 
         return withArgs(x, xid, xdr_Device_EnableSrqParms, out,
                         [&](Device_EnableSrqParms& a) { replyError(xid, device.enableSrq(a), out); });
     case device_docmd:
-        return withArgs(x, xid, xdr_Device_DocmdParms, out, [&](Device_DocmdParms&) {
-            Device_DocmdResp r;
-            std::memset(&r, 0, sizeof r);
-            r.error = 8; // no device-specific commands
-            replyResult(xid, xdrProc(xdr_Device_DocmdResp), &r, out);
-        });
+        return answer(x, xid, xdr_Device_DocmdParms, xdr_Device_DocmdResp, out,
+                      [](Device_DocmdParms&, Device_DocmdResp& r) { r.error = 8; }); // no device-specific commands
     case create_intr_chan:
         return withArgs(x, xid, xdr_Device_RemoteFunc, out,
                         [&](Device_RemoteFunc& a) { replyError(xid, device.createIntrChan(a), out); });
@@ -264,18 +268,7 @@ bool encodeSrqCall(std::uint32_t xid, const std::string& handle, std::vector<std
     out.assign(4 + 512 + handle.size(), 0);
     XDR x;
     xdrmem_create(&x, reinterpret_cast<char*>(out.data()) + 4, static_cast<u_int>(out.size() - 4), XDR_ENCODE);
-    bool ok = xdr_callmsg(&x, &call) && xdr_Device_SrqParms(&x, &parms);
-    std::uint32_t used = xdr_getpos(&x);
-    xdr_destroy(&x);
-    if (!ok) {
-        return false;
-    }
-    out.resize(4 + used);
-    std::uint32_t header = RECORD_LAST_FRAGMENT | used;
-    for (int i = 0; i < 4; ++i) {
-        out[i] = static_cast<std::uint8_t>(header >> (24 - 8 * i));
-    }
-    return true;
+    return finishRecord(x, xdr_callmsg(&x, &call) && xdr_Device_SrqParms(&x, &parms), out);
 }
 
 } // namespace LbPmxLan
