@@ -54,7 +54,6 @@ namespace {
             kMaxOffsetDb },
         { "UNIT POWer", eUnit, eUnitChoice, eSetAndQuery, 0, 0 },
         { "SYSTem VERSion", eVersion, eNoParameter, eQueryOnly, 0, 0 },
-        { "FORMat [DATA]", eFormat, eNoParameter, eQueryOnly, 0, 0 },
     };
 
     // One keyword of a pattern: its long form, its short form (the upper-case letters), both in

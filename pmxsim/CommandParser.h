@@ -35,8 +35,7 @@ enum EAction {
     eAveraging, // [SENS:]AVER[:STAT]
     eOffset, // [SENS:]CORR:OFFS
     eUnit, // UNIT:POW
-    eVersion, // SYST:VERS?
-    eFormat // FORM[:DATA]?: the format of the results
+    eVersion // SYST:VERS?
 };
 
 // The choices of FUNC and UNIT:POW, as nValue.

@@ -17,8 +17,6 @@ namespace {
     const float kFloorDbm = -60.0f; // level outside the pulse of a trace
     const double kResponseDbPerGHz = -0.2; // level change per GHz away from 1 GHz
     const char* const kScpiVersion = "1999.0";
-    // Every value leaves the sensor as a 32-bit float (the float getters); it has no other format.
-    const char* const kDataFormat = "REAL,32";
     // Bits of the event status register.
     const int32_t kEventOperationComplete = 1;
     const int32_t kEventCommandError = 32;
@@ -230,7 +228,6 @@ void CSimulator::applyCommand(SSensor& sensor, const SCommand& command, Clock::t
     case eServiceEnable:
     case eSelfTest:
     case eVersion:
-    case eFormat:
         applyStatusCommand(sensor, command);
         break;
     case eFunction:
@@ -281,9 +278,6 @@ void CSimulator::applyStatusCommand(SSensor& sensor, const SCommand& command)
         break;
     case eVersion:
         addText(sensor, kScpiVersion);
-        break;
-    case eFormat:
-        addText(sensor, kDataFormat);
         break;
     default:
         break;

@@ -87,8 +87,7 @@ TEST_F(PmxSimTest, PowerMeterSettingsAnswerTheirQueriesAndRefuseBadParameters)
     const char* const kAnswers[][2] = { { "freq?", "1e+09" }, { "aver?", "0" },
         { "sens:aver:coun?", "1" }, { "corr:offs?", "0" }, { "unit:pow?", "DBM" },
         { "func?", "POWER" }, { "trac:poin?", "100" }, { "init:cont?", "0" }, { "*ese?", "0" },
-        { "*opc?", "1" }, { "*tst?", "0" }, { "syst:vers?", "1999.0" }, { "form?", "REAL,32" },
-        { ":FORMat:DATA?", "REAL,32" } };
+        { "*opc?", "1" }, { "*tst?", "0" }, { "syst:vers?", "1999.0" } };
     for (const auto& pair : kAnswers)
         EXPECT_EQ(pair[1], ask(handle, pair[0]));
     command(handle, "SENSe:FREQuency 2.5 GHz");
@@ -109,7 +108,7 @@ TEST_F(PmxSimTest, PowerMeterSettingsAnswerTheirQueriesAndRefuseBadParameters)
     m_aRecorder.clear();
     const char* const kBad[] = { "freq 5", "freq 1 thz", "aver:coun 0", "aver maybe",
         "corr:offs 101", "unit:pow dbw", "*ese 256", "freq? 1", "read", "*idn", "meas:volt?",
-        "trac:poin 1025", "form asc" };
+        "trac:poin 1025" };
     for (const char* bad : kBad)
         command(handle, bad);
     size_t refused = 0;
