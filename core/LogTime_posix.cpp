@@ -13,8 +13,8 @@ namespace {
 locale_t environmentLocale()
 {
     static locale_t s_aLocale = [] {
-        locale_t locale = newlocale(LC_TIME_MASK, "", (locale_t)0);
-        return locale != (locale_t)0 ? locale : newlocale(LC_TIME_MASK, "C", (locale_t)0);
+        locale_t locale = newlocale(LC_TIME_MASK, "", (locale_t)nullptr);
+        return locale != (locale_t)nullptr ? locale : newlocale(LC_TIME_MASK, "C", (locale_t)nullptr);
     }();
     return s_aLocale;
 }
@@ -22,7 +22,7 @@ locale_t environmentLocale()
 
 void format(std::string& date, std::string& time)
 {
-    std::time_t now = std::time(0);
+    std::time_t now = std::time(nullptr);
     struct tm local;
     localtime_r(&now, &local);
     char buffer[16];

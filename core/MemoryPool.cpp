@@ -17,7 +17,7 @@ CMemoryPool& CMemoryPool::getInstance()
 void* CMemoryPool::allocate(std::size_t size, int, int, int)
 {
     void* pointer = std::malloc(size == 0 ? 1 : size);
-    if (pointer == 0) {
+    if (pointer == nullptr) {
         s_cLogger.error("LbCore::CMemoryPool::allocate") << "Could not allocate " << static_cast<unsigned long long>(size) << " bytes";
     }
     return pointer;
@@ -31,7 +31,7 @@ void CMemoryPool::free(void* pointer)
 void* CMemoryPool::CMemoryPoolManaged::operator new(std::size_t size)
 {
     void* pointer = CMemoryPool::getInstance().allocate(size, 0, 0, 0);
-    if (pointer == 0) {
+    if (pointer == nullptr) {
         throw std::bad_alloc();
     }
     return pointer;

@@ -15,7 +15,7 @@ public:
 
     T* getParent() const
     {
-        if (m_pcParent == 0) {
+        if (m_pcParent == nullptr) {
             throw std::runtime_error("NULL pointer m_pcParent");
         }
         return m_pcParent;

@@ -24,7 +24,7 @@ public:
 
     ~CQueue() override
     {
-        T* item = 0;
+        T* item = nullptr;
         int result;
         while ((result = pop(item, 0)) != RESULT_TIMEOUT) {
             if (result == RESULT_ITEM) {

@@ -24,7 +24,7 @@ static sem_t* semOf(void* handle)
     return static_cast<sem_t*>(handle);
 }
 
-CSemaphore::CSemaphore(unsigned initialCount) : m_aSemaphore(0)
+CSemaphore::CSemaphore(unsigned initialCount) : m_aSemaphore(nullptr)
 {
     sem_t* semaphore = new sem_t;
     if (initialCount > MAX_COUNT || sem_init(semaphore, 0, initialCount) != 0) {

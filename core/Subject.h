@@ -70,7 +70,7 @@ public:
     R notify(A argument, Member member)
     {
         R result = m_cDefault;
-        if (member == 0) {
+        if (member == nullptr) {
             return result;
         }
         CLock<CCriticalSection> lock(this->m_cLock);
@@ -93,13 +93,13 @@ class CSubject<T, void(A)> : public CSubjectBase<T> {
 public:
     typedef void (T::*Member)(A);
 
-    explicit CSubject(Member member = 0) : m_pfMember(member) {}
+    explicit CSubject(Member member = nullptr) : m_pfMember(member) {}
 
     void notify(A argument) { notify(argument, m_pfMember); }
 
     void notify(A argument, Member member)
     {
-        if (member == 0) {
+        if (member == nullptr) {
             return;
         }
         CLock<CCriticalSection> lock(this->m_cLock);

@@ -10,13 +10,13 @@ namespace LbCore {
 static CLogger s_cLogger = CLogManager::getLogger("CThread");
 
 CThread::CThread()
-    : m_pcRunnable(this), m_hThread(0), m_nThreadId(0), m_nState(STATE_IDLE), m_cStarted(0), m_cFinished(0),
+    : m_pcRunnable(this), m_hThread(nullptr), m_nThreadId(0), m_nState(STATE_IDLE), m_cStarted(0), m_cFinished(0),
       m_cStopHandshake(0), m_cObservers(&CObserver::execute)
 {
 }
 
 CThread::CThread(CIRunnable& runnable)
-    : m_pcRunnable(&runnable), m_hThread(0), m_nThreadId(0), m_nState(STATE_IDLE), m_cStarted(0), m_cFinished(0),
+    : m_pcRunnable(&runnable), m_hThread(nullptr), m_nThreadId(0), m_nState(STATE_IDLE), m_cStarted(0), m_cFinished(0),
       m_cStopHandshake(1), m_cObservers(&CObserver::execute)
 {
 }
@@ -27,7 +27,7 @@ CThread::~CThread()
         s_cLogger.warn("LbCore::CThread::~CThread") << "Thread has been not stopped safely";
         terminate();
     }
-    if (m_hThread != 0 && !ThreadPlatform::close(m_hThread)) {
+    if (m_hThread != nullptr && !ThreadPlatform::close(m_hThread)) {
         s_cLogger.error("LbCore::CThread::~CThread") << "Could not close the handle for thread " << m_hThread;
     }
 }
@@ -44,21 +44,21 @@ int CThread::start()
         }
         m_nState = STATE_RUNNING;
     }
-    if (m_hThread != 0) {
+    if (m_hThread != nullptr) {
         // A thread of an earlier start has ended; release it before making the next one.
         ThreadPlatform::close(m_hThread);
-        m_hThread = 0;
+        m_hThread = nullptr;
     }
     // That thread's end signal is left over when join() found it idle; it must not end a
     // join() of the new thread.
     while (m_cFinished.wait(0)) {
     }
-    void* handle = 0;
+    void* handle = nullptr;
     std::uint32_t id = 0;
     if (!ThreadPlatform::create(&CThread::threadMain, this, handle, id)) {
         s_cLogger.error("LbCore::CThread::start") << "Could not start thread!";
         setState(STATE_IDLE);
-        m_hThread = 0;
+        m_hThread = nullptr;
         return RESULT_NOT_CREATED;
     }
     m_hThread = handle;

@@ -31,7 +31,7 @@ void* trampoline(void* start)
     CStart copy = *static_cast<CStart*>(start);
     delete static_cast<CStart*>(start);
     copy.entry(copy.argument);
-    return 0;
+    return nullptr;
 }
 } // namespace
 
@@ -40,7 +40,7 @@ bool create(unsigned (*entry)(void*), void* argument, void*& handle, std::uint32
     // Without memory for the start record no thread can be made: reported like any failed
     // creation, so start() returns to idle instead of throwing with the state left running.
     CStart* start = new (std::nothrow) CStart{entry, argument};
-    if (start == 0) {
+    if (start == nullptr) {
         return false;
     }
     pthread_t thread;
@@ -53,7 +53,7 @@ bool create(unsigned (*entry)(void*), void* argument, void*& handle, std::uint32
     // still gets its thread, with the default stack.
     int created = small ? pthread_create(&thread, &attributes, &trampoline, start) : EINVAL;
     if (created == EINVAL) {
-        created = pthread_create(&thread, 0, &trampoline, start);
+        created = pthread_create(&thread, nullptr, &trampoline, start);
     }
     if (initialised) {
         pthread_attr_destroy(&attributes);
@@ -75,7 +75,7 @@ bool terminate(void*)
 
 bool close(void* handle)
 {
-    return pthread_join(reinterpret_cast<pthread_t>(handle), 0) == 0;
+    return pthread_join(reinterpret_cast<pthread_t>(handle), nullptr) == 0;
 }
 
 } // namespace ThreadPlatform

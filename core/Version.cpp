@@ -36,14 +36,14 @@ SModuleVersion buildModuleVersion(const std::string& path)
 
 } // namespace
 
-CVersion::CVersion(const std::string& path) : m_pbyFixedInfo(0)
+CVersion::CVersion(const std::string& path) : m_pbyFixedInfo(nullptr)
 {
     if (!readBlock(path)) {
         throw CVersionException(c_szNoVersionInfo);
     }
-    const void* value = 0;
+    const void* value = nullptr;
     std::size_t size = 0;
-    if (!queryValue("\\", value, size) || value == 0 || size < c_nFixedWords * sizeof(std::uint32_t)) {
+    if (!queryValue("\\", value, size) || value == nullptr || size < c_nFixedWords * sizeof(std::uint32_t)) {
         m_cBlock.clear();
         throw CVersionException(c_szNoVersionInfo);
     }
@@ -95,9 +95,9 @@ std::uint16_t CVersion::getProductRevision() const { return static_cast<std::uin
 std::string CVersion::getQueryValue(const std::string& key) const
 {
     const CVersionException missing("CVersion::getQueryValue() can't get the value for the key:" + key);
-    const void* value = 0;
+    const void* value = nullptr;
     std::size_t size = 0;
-    if (!queryValue("\\VarFileInfo\\Translation", value, size) || value == 0 || size < 2 * sizeof(std::uint16_t)) {
+    if (!queryValue("\\VarFileInfo\\Translation", value, size) || value == nullptr || size < 2 * sizeof(std::uint16_t)) {
         throw missing;
     }
     std::uint16_t translation[2];
@@ -114,7 +114,7 @@ std::string CVersion::getQueryValue(const std::string& key) const
     if (length < 0 || static_cast<std::size_t>(length) >= sizeof(path)) {
         throw missing;
     }
-    if (!queryValue(path, value, size) || value == 0) {
+    if (!queryValue(path, value, size) || value == nullptr) {
         throw missing;
     }
     const char* text = static_cast<const char*>(value);

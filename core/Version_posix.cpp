@@ -138,12 +138,12 @@ bool CVersion::queryValue(const std::string& path, const void*& value, std::size
     const char* const end = reinterpret_cast<const char*>(m_cBlock.data() + m_cBlock.size());
     while (cursor < end && *cursor != '\0') {
         const char* const keyEnd = static_cast<const char*>(std::memchr(cursor, '\0', end - cursor));
-        if (keyEnd == 0 || keyEnd + 1 >= end) {
+        if (keyEnd == nullptr || keyEnd + 1 >= end) {
             return false;
         }
         const char* const text = keyEnd + 1;
         const char* const textEnd = static_cast<const char*>(std::memchr(text, '\0', end - text));
-        if (textEnd == 0) {
+        if (textEnd == nullptr) {
             return false;
         }
         if (equalsIgnoringCase(cursor, key.c_str())) {
@@ -159,11 +159,11 @@ bool CVersion::queryValue(const std::string& path, const void*& value, std::size
 std::string CVersion::getModulePath()
 {
     Dl_info info;
-    struct link_map* module = 0;
-    if (dladdr1(&s_cModuleAnchor, &info, reinterpret_cast<void**>(&module), RTLD_DL_LINKMAP) == 0 || module == 0) {
+    struct link_map* module = nullptr;
+    if (dladdr1(&s_cModuleAnchor, &info, reinterpret_cast<void**>(&module), RTLD_DL_LINKMAP) == 0 || module == nullptr) {
         return std::string();
     }
-    if (module->l_name != 0 && module->l_name[0] != '\0') {
+    if (module->l_name != nullptr && module->l_name[0] != '\0') {
         return module->l_name;
     }
     // The main program's entry has no name; the kernel knows its file.

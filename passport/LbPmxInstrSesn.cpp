@@ -112,7 +112,7 @@ void CLbPmxInstrSesn::CVisaEventListener::raise(ViEventType type)
 // ---- lifecycle
 
 CLbPmxInstrSesn::CLbPmxInstrSesn()
-    : m_nSession(0), m_pcRecord(0), m_nClosed(0), m_nClosingFromDestructor(0),
+    : m_nSession(0), m_pcRecord(nullptr), m_nClosed(0), m_nClosingFromDestructor(0),
       m_cSrqListener(this), m_cUsbListener(this), m_cExceptionListener(this)
 {
 }
@@ -153,13 +153,13 @@ ViStatus CLbPmxInstrSesn::viOpen(ViConstRsrc name, ViAccessMode, ViUInt32)
             s_cLogger.warn(OPERATION) << "There are already " << MAX_OPEN_BEFORE_OPEN << " active devices...";
             return VI_ERROR_RSRC_NFOUND;
         }
-        m_pcSession = dispatcher.getSession(CPmxResourceInfo(name == 0 ? std::string() : std::string(name)));
+        m_pcSession = dispatcher.getSession(CPmxResourceInfo(name == nullptr ? std::string() : std::string(name)));
         try {
             const ViEventType events[3] = {VI_EVENT_SERVICE_REQ, VI_EVENT_EXCEPTION, VI_EVENT_USB_INTR};
             CNiViSv::declareEvents(m_nSession, 3, events, 0);
         } catch (...) {
         }
-        if (m_pcRecord != 0) {
+        if (m_pcRecord != nullptr) {
             m_pcRecord[CNiViSv::RECORD_PASSPORT_SLOT] = static_cast<CBasePassport*>(this);
         }
         return CNiViSv::installTable(m_nSession, getVectorTable(), 0, m_nSession, 0);
@@ -175,9 +175,9 @@ ViStatus CLbPmxInstrSesn::viOpen(ViConstRsrc name, ViAccessMode, ViUInt32)
 ViStatus CLbPmxInstrSesn::viClose()
 {
     CPassportLock lock;
-    if (m_pcRecord != 0) {
-        m_pcRecord[CNiViSv::RECORD_PASSPORT_SLOT] = 0;
-        m_pcRecord = 0;
+    if (m_pcRecord != nullptr) {
+        m_pcRecord[CNiViSv::RECORD_PASSPORT_SLOT] = nullptr;
+        m_pcRecord = nullptr;
     }
     if (m_nClosingFromDestructor == 0) {
         m_nClosed = 1;
@@ -190,13 +190,13 @@ ViStatus CLbPmxInstrSesn::viClose()
 
 ViStatus CLbPmxInstrSesn::viWrite(ViConstBuf buffer, ViUInt32 count, ViPUInt32 returnCount)
 {
-    if (buffer == 0) {
+    if (buffer == nullptr) {
         return VI_ERROR_INV_PARAMETER;
     }
     return guarded("LbPmxPassport::CLbPmxInstrSesn::viWrite", WRITE_MAP, [&] {
         std::string command(reinterpret_cast<const char*>(buffer), count);
         m_pcSession->write(command);
-        if (returnCount != 0) {
+        if (returnCount != nullptr) {
             *returnCount = static_cast<ViUInt32>(command.size());
         }
         return VI_SUCCESS;
@@ -205,14 +205,14 @@ ViStatus CLbPmxInstrSesn::viWrite(ViConstBuf buffer, ViUInt32 count, ViPUInt32 r
 
 ViStatus CLbPmxInstrSesn::viRead(ViPBuf buffer, ViUInt32 count, ViPUInt32 returnCount)
 {
-    if (buffer == 0) {
+    if (buffer == nullptr) {
         return VI_ERROR_INV_PARAMETER;
     }
     return guarded("LbPmxPassport::CLbPmxInstrSesn::viRead", READ_MAP, [&] {
         std::uint32_t bytes = 0;
         CPmxDataBuffer data(*m_pcSession, reinterpret_cast<char*>(buffer), count, &bytes);
         m_pcSession->read(data);
-        if (returnCount != 0) {
+        if (returnCount != nullptr) {
             *returnCount = bytes;
         }
         return VI_SUCCESS;
@@ -229,7 +229,7 @@ ViStatus CLbPmxInstrSesn::viAssertTrigger(ViUInt16)
 
 ViStatus CLbPmxInstrSesn::viReadSTB(ViPUInt16 status)
 {
-    if (status == 0) {
+    if (status == nullptr) {
         return VI_ERROR_INV_PARAMETER;
     }
     return guarded("LbPmxPassport::CLbPmxInstrSesn::viReadSTB", PLAIN_MAP, [&] {
@@ -261,11 +261,11 @@ ViStatus CLbPmxInstrSesn::findAttribute(ViAttr, ViUInt16, ViAttrState, ViConstSt
 ViStatus CLbPmxInstrSesn::viParseRsrc(ViSession, ViConstRsrc name, ViPUInt16 type, ViPUInt16 number)
 {
     try {
-        CPmxResourceInfo resource(name == 0 ? std::string() : std::string(name));
+        CPmxResourceInfo resource(name == nullptr ? std::string() : std::string(name));
     } catch (...) {
         return VI_ERROR_RSRC_NFOUND;
     }
-    if (type == 0 || number == 0) {
+    if (type == nullptr || number == nullptr) {
         return VI_ERROR_INV_PARAMETER;
     }
     *number = 0;
@@ -280,13 +280,13 @@ ViStatus CLbPmxInstrSesn::viParseRsrcEx(ViSession rm, ViConstRsrc name, ViPUInt1
     if (status != VI_SUCCESS) {
         return status;
     }
-    if (resourceClass != 0) {
+    if (resourceClass != nullptr) {
         copyText(resourceClass, "INSTR");
     }
-    if (expandedName != 0 && name != 0) {
+    if (expandedName != nullptr && name != nullptr) {
         copyText(expandedName, name);
     }
-    if (alias != 0) {
+    if (alias != nullptr) {
         copyText(alias, "");
     }
     return VI_SUCCESS;
@@ -331,7 +331,7 @@ ViStatus CLbPmxInstrSesn::viFindRsrc(ViSession rm, ViConstString expression, ViP
                 return match;
             }
         }
-        if (findList == 0) {
+        if (findList == nullptr) {
             return VI_ERROR_INV_PARAMETER;
         }
         status = CNiViSv::appendFound(*findList, resource, 0);
@@ -354,7 +354,7 @@ void store(void* destination, T value)
 
 ViStatus CLbPmxInstrSesn::viGetAttribute(ViAttr attribute, void* value)
 {
-    if (value == 0) {
+    if (value == nullptr) {
         return VI_ERROR_INV_PARAMETER;
     }
     // The version information of the module may be unreadable; no exception leaves the passport.
@@ -429,7 +429,7 @@ LbPmxVisa::CIPmxEventListener* CLbPmxInstrSesn::listenerFor(ViEventType type)
     case VI_EVENT_SERVICE_REQ: return &m_cSrqListener;
     case VI_EVENT_USB_INTR: return &m_cUsbListener;
     case VI_EVENT_EXCEPTION: return &m_cExceptionListener;
-    default: return 0;
+    default: return nullptr;
     }
 }
 
@@ -439,7 +439,7 @@ ViStatus CLbPmxInstrSesn::enableListener(ViEventType type, bool enable)
         return VI_SUCCESS;
     }
     LbPmxVisa::CIPmxEventListener* listener = listenerFor(type);
-    if (listener == 0) {
+    if (listener == nullptr) {
         return VI_ERROR_INV_EVENT;
     }
     try {

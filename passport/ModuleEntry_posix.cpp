@@ -18,7 +18,7 @@ namespace LbPmxPassport {
 bool queryConfigurationValue(const char* name, char (&buffer)[CONFIGURATION_VALUE_SIZE], unsigned& size)
 {
     const char* value = std::getenv((std::string("LBVIPMX_") + name).c_str());
-    if (value == 0) {
+    if (value == nullptr) {
         return false;
     }
     std::size_t bytes = std::strlen(value) + 1;

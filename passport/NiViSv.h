@@ -2,7 +2,8 @@
 // static operation per service. On Windows the services are imported by ordinal only (import
 // library built from NiViSv64.def); elsewhere by their names viSvc<ordinal>. No logic here:
 // every operation passes its arguments through and returns the service's result.
-#pragma once
+#ifndef LBPMXPASSPORT_NIVISV_H
+#define LBPMXPASSPORT_NIVISV_H
 
 #include "visahost/include/visa.h"
 
@@ -55,3 +56,5 @@ class CNiViSv {
 };
 
 }  // namespace LbPmxPassport
+
+#endif

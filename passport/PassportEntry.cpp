@@ -20,8 +20,8 @@ namespace LbPmxPassport {
 
 namespace {
 
-CNiViSv::THandle s_hPassportLock = 0;
-CNiViSv::THandle s_hVectorTable = 0;
+CNiViSv::THandle s_hPassportLock = nullptr;
+CNiViSv::THandle s_hVectorTable = nullptr;
 // Set at process detach. The module's static objects go right after it, so an operation that
 // arrives later (an exit handler of the application closing its sessions) must not reach them.
 std::atomic<bool> s_bDetached(false);
@@ -35,7 +35,7 @@ LbCore::CLogger s_cLogger = LbCore::CLogManager::getLogger("CLbPmxInstrSesn");
 CBasePassport* objectOf(ViSession session)
 {
     ViAddr* record = CNiViSv::sessionRecord(session);
-    return record == 0 ? 0 : static_cast<CBasePassport*>(record[CNiViSv::RECORD_PASSPORT_SLOT]);
+    return record == nullptr ? nullptr : static_cast<CBasePassport*>(record[CNiViSv::RECORD_PASSPORT_SLOT]);
 }
 
 // Each entry function forwards to the session's object. A handle without an object (never
@@ -48,7 +48,7 @@ ViStatus forward(ViSession session, F call)
         return VI_ERROR_SYSTEM_ERROR;
     }
     CBasePassport* object = objectOf(session);
-    return object == 0 ? VI_ERROR_INV_OBJECT : call(*object);
+    return object == nullptr ? VI_ERROR_INV_OBJECT : call(*object);
 }
 
 ViStatus _VI_FUNC entryFindRsrc(ViSession rm, ViConstString expression, ViPFindList findList)
@@ -78,7 +78,7 @@ ViStatus _VI_FUNC entryParseRsrcEx(ViSession rm, ViConstRsrc name, ViPUInt16 typ
 
 ViStatus _VI_FUNC entryOpen(ViSession, ViConstRsrc name, ViAccessMode mode, ViUInt32 timeout, ViPSession session)
 {
-    if (session == 0) {
+    if (session == nullptr) {
         return VI_ERROR_INV_PARAMETER;
     }
     if (s_bDetached) {
@@ -87,13 +87,13 @@ ViStatus _VI_FUNC entryOpen(ViSession, ViConstRsrc name, ViAccessMode mode, ViUI
     // Without the runtime's record the object could never be reached again (nor closed, nor
     // counted out of the open sensor sessions): the open fails before anything is opened.
     ViAddr* record = CNiViSv::sessionRecord(*session);
-    if (record == 0) {
+    if (record == nullptr) {
         s_cLogger.error("LbPmxPassport::CLbPmxInstrSesn::viOpen") << "No session record for session "
                           << *session;
         return VI_ERROR_SYSTEM_ERROR;
     }
     CLbPmxInstrSesn* object = new (std::nothrow) CLbPmxInstrSesn();
-    if (object == 0) {
+    if (object == nullptr) {
         return VI_ERROR_ALLOC;
     }
     object->setVisaSession(*session, record);
@@ -117,7 +117,7 @@ ViStatus _VI_FUNC entryClose(ViObject session)
         return VI_SUCCESS;
     }
     CBasePassport* object = objectOf(session);
-    if (object == 0) {
+    if (object == nullptr) {
         return VI_SUCCESS;
     }
     {
@@ -352,7 +352,7 @@ void readConfiguration()
     }
     // Compared byte for byte including the terminating zero: no case folding, no trimming. A
     // value that fills its whole buffer without a zero is no text at all.
-    if (std::memchr(buffer, '\0', sizeof buffer) == 0) {
+    if (std::memchr(buffer, '\0', sizeof buffer) == nullptr) {
         return;
     }
     std::string level = textOf(buffer, size);

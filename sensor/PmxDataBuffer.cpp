@@ -25,7 +25,7 @@ struct CPmxDataBuffer::CTypeMapping<T, 1> {
 };
 
 CPmxDataBuffer::CPmxDataBuffer(CPmxSession& session, char* buffer, std::size_t capacity, std::uint32_t* count)
-    : LbCore::CParent<CPmxSession>(&session), m_pcPosition(buffer), m_nCapacity(capacity), m_pnCount(count), m_pcSpill(0)
+    : LbCore::CParent<CPmxSession>(&session), m_pcPosition(buffer), m_nCapacity(capacity), m_pnCount(count), m_pcSpill(nullptr)
 {
 }
 
@@ -58,7 +58,7 @@ std::size_t CPmxDataBuffer::getRoom() const
 
 bool CPmxDataBuffer::spill(const char* source, std::size_t length, bool text)
 {
-    if (m_pcSpill == 0) {
+    if (m_pcSpill == nullptr) {
         return false;
     }
     if (!m_pcSpill->m_bActive) {
@@ -73,7 +73,7 @@ bool CPmxDataBuffer::spill(const char* source, std::size_t length, bool text)
 
 void CPmxDataBuffer::write(const std::string& text)
 {
-    if ((m_pcSpill != 0 && m_pcSpill->m_bActive) || text.size() + 1 > getRoom()) {
+    if ((m_pcSpill != nullptr && m_pcSpill->m_bActive) || text.size() + 1 > getRoom()) {
         if (spill(text.data(), text.size(), true)) {
             return;
         }
@@ -113,7 +113,7 @@ void CPmxDataBuffer::write(const CSpill& reply)
 
 void CPmxDataBuffer::writeRaw(const void* source, unsigned length)
 {
-    if ((m_pcSpill != 0 && m_pcSpill->m_bActive) || length > getRoom()) {
+    if ((m_pcSpill != nullptr && m_pcSpill->m_bActive) || length > getRoom()) {
         if (spill(static_cast<const char*>(source), length, false)) {
             return;
         }
@@ -129,7 +129,7 @@ void CPmxDataBuffer::writeRaw(const void* source, unsigned length)
 bool CPmxDataBuffer::copyTo(char* destination, const void* source, std::size_t length)
 {
     // Compared as addresses: the destination may lie anywhere, even outside the caller's buffer.
-    if (m_pcSpill != 0 && m_pcSpill->m_bActive) {
+    if (m_pcSpill != nullptr && m_pcSpill->m_bActive) {
         return false;
     }
     std::uintptr_t start = reinterpret_cast<std::uintptr_t>(m_pcPosition) - *m_pnCount;
@@ -187,7 +187,7 @@ std::string formatFloat(float value)
             digits += *p;
         }
     }
-    long exponent = (*p != '\0') ? std::strtol(p + 1, 0, 10) : 0;
+    long exponent = (*p != '\0') ? std::strtol(p + 1, nullptr, 10) : 0;
     std::string exponentDigits = std::to_string(exponent < 0 ? -exponent : exponent);
     while (exponentDigits.size() < 3) {
         exponentDigits.insert(exponentDigits.begin(), '0');

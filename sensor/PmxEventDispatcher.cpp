@@ -28,7 +28,7 @@ CPmxEventDispatcher::CPmxEventMessage::CPmxEventMessage(CPmxEventDispatcher* dis
 
 CPmxEventDispatcher::CPmxEventMessage::~CPmxEventMessage()
 {
-    if (m_pcParent != 0) {
+    if (m_pcParent != nullptr) {
         m_pcParent->m_cWorker.detach(*this);
     }
 }
@@ -62,7 +62,7 @@ CPmxEventDispatcher::CPmxEventDispatcher(CPmxSession* session)
         {
             LbCore::CLogMessage message = s_cLogger.error("LbPmxVisa::CPmxEventDispatcher::CPmxEventDispatcher");
             message << "Could not start thread! Undefined behavior! Session ";
-            if (session != 0) {
+            if (session != nullptr) {
                 message << session;
             }
         }
@@ -87,12 +87,12 @@ void CPmxEventDispatcher::shutdown()
 
 bool CPmxEventDispatcher::addListener(CIPmxEventListener* listener)
 {
-    return listener != 0 && m_cListeners.attach(*listener);
+    return listener != nullptr && m_cListeners.attach(*listener);
 }
 
 bool CPmxEventDispatcher::removeListener(CIPmxEventListener* listener)
 {
-    return listener != 0 && m_cListeners.detach(*listener);
+    return listener != nullptr && m_cListeners.detach(*listener);
 }
 
 void CPmxEventDispatcher::notifyCommandAcceptedEvent(const CPmxEvent& event)
@@ -124,7 +124,7 @@ void CPmxEventDispatcher::notifyDeviceChangedEvent(const CPmxEvent& event)
 // cannot be made is logged and the event is lost rather than taking the library down.
 void CPmxEventDispatcher::queue(const CPmxEvent& event, PmxNotification operation)
 {
-    CPmxEventMessage* message = 0;
+    CPmxEventMessage* message = nullptr;
     try {
         message = new CPmxEventMessage(this, event, operation);
     } catch (const std::exception& e) {
@@ -141,7 +141,7 @@ bool CPmxEventDispatcher::init()
 
 bool CPmxEventDispatcher::run()
 {
-    CPmxEventMessage* message = 0;
+    CPmxEventMessage* message = nullptr;
     if (m_cQueue.pop(message, LbCore::CSemaphore::INFINITE_WAIT) != LbCore::CQueue<CPmxEventMessage>::RESULT_ITEM) {
         return false;
     }

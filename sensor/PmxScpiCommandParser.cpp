@@ -109,10 +109,10 @@ int scpiCompare(const char* pattern, const char* input)
     if (pattern == input) {
         return 0;
     }
-    if (pattern == 0) {
+    if (pattern == nullptr) {
         return -1;
     }
-    if (input == 0) {
+    if (input == nullptr) {
         return 1;
     }
     return compareHeader(pattern, input);

@@ -117,7 +117,7 @@ void CPmxSession::takeAcknowledgement()
                 std::chrono::duration_cast<std::chrono::milliseconds>(std::chrono::steady_clock::now() - start).count());
             left = spent >= timeout ? 0 : timeout - spent;
         }
-        CPmxSessionMessage* message = 0;
+        CPmxSessionMessage* message = nullptr;
         if (m_cMessageQueue.pop(message, toWait(left)) != CMessageQueue::RESULT_ITEM) {
             return;
         }
@@ -134,7 +134,7 @@ void CPmxSession::takeAcknowledgement()
 
 void CPmxSession::clearMessages()
 {
-    CPmxSessionMessage* message = 0;
+    CPmxSessionMessage* message = nullptr;
     int result;
     while ((result = m_cMessageQueue.pop(message, 0)) != CMessageQueue::RESULT_TIMEOUT) {
         if (result == CMessageQueue::RESULT_ITEM) {
@@ -172,7 +172,7 @@ void CPmxSession::write(const std::string& command)
             while (session.m_nMessageCount + 1 < session.m_nCommandCount && result == CMessageQueue::RESULT_ITEM) {
                 s_cLogger.warn("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "Asynchronous Message detected! Will be deleted to ensure stable further working!";
                 if (session.m_cMessageQueue.size() >= 1) {
-                    CPmxSessionMessage* stale = 0;
+                    CPmxSessionMessage* stale = nullptr;
                     result = session.m_cMessageQueue.pop(stale, 0);
                     if (result == CMessageQueue::RESULT_ITEM) {
                         delete stale;
@@ -191,7 +191,7 @@ void CPmxSession::write(const std::string& command)
             if (session.m_bSensorRemoved) {
                 throw CPmxSensorRemovedException();
             }
-            CPmxSessionMessage* message = 0;
+            CPmxSessionMessage* message = nullptr;
             if (session.m_cMessageQueue.pop(message, toWait(session.m_nTimeout)) != CMessageQueue::RESULT_ITEM) {
                 s_cLogger.info("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "No message arrived for session " << &session;
                 ++session.m_nMessageCount;
@@ -318,7 +318,7 @@ void CPmxSession::read(CPmxDataBuffer& buffer)
 void CPmxSession::readSTB(std::uint16_t* status)
 {
     s_cLogger.info("LbPmxVisa::CPmxSession::readSTB") << "Reading status byte register " << this;
-    if (status == 0) {
+    if (status == nullptr) {
         throw std::invalid_argument("NULL pointer status");
     }
     std::uint8_t flags = 0;

@@ -19,7 +19,7 @@ CPmxSessionDispatcher::CPmxCommandException::CPmxCommandException(std::int32_t c
     // interface the message stays empty.
     char text[1024] = {0};
     CIPmxCommands* commands = CPmxSessionDispatcher::getInstance().m_pcCommand;
-    if (commands != 0) {
+    if (commands != nullptr) {
         commands->getErrorText(code, text, sizeof(text));
         text[sizeof(text) - 1] = 0;
     }
@@ -29,7 +29,7 @@ CPmxSessionDispatcher::CPmxCommandException::CPmxCommandException(std::int32_t c
 // ---- CPmxSessionDispatcher
 
 CPmxSessionDispatcher::CPmxSessionDispatcher()
-    : m_pcCommand(0), m_sManufacturerName("Marlowe&Tenby"), m_nManufacturerId(3891)
+    : m_pcCommand(nullptr), m_sManufacturerName("Marlowe&Tenby"), m_nManufacturerId(3891)
 {
     s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::CPmxSessionDispatcher") << "CPmxSessionDispatcher created";
 }
@@ -37,7 +37,7 @@ CPmxSessionDispatcher::CPmxSessionDispatcher()
 CPmxSessionDispatcher::~CPmxSessionDispatcher()
 {
     CIPmxCommands* commands = m_pcCommand;
-    if (commands != 0) {
+    if (commands != nullptr) {
         detach(commands);
     }
 }
@@ -55,7 +55,7 @@ void CPmxSessionDispatcher::attach(CIPmxCommands* commands)
         return;
     }
     self.m_pcCommand = commands;
-    if (commands == 0) {
+    if (commands == nullptr) {
         s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::attach") << "m_pcCommand has not been set...";
         return;
     }
@@ -72,18 +72,18 @@ void CPmxSessionDispatcher::detach(CIPmxCommands* commands)
         s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::detach") << "Commands interface will be detached, when still some sessions are open. "
                           << "This behavior is resulting in a undefined state";
     }
-    self.m_pcCommand = 0;
+    self.m_pcCommand = nullptr;
 }
 
 void CPmxSessionDispatcher::forget(CIPmxCommands* commands)
 {
-    getInstance().m_pcCommand.compare_exchange_strong(commands, 0);
+    getInstance().m_pcCommand.compare_exchange_strong(commands, nullptr);
 }
 
 CIPmxCommands* CPmxSessionDispatcher::getCommands()
 {
     CIPmxCommands* commands = m_pcCommand;
-    if (commands == 0) {
+    if (commands == nullptr) {
         throw std::runtime_error("No configuration has been set. Use method attach(...) for set a configuration");
     }
     return commands;

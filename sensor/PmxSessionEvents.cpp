@@ -61,7 +61,7 @@ void CPmxSession::notifyCommandAcceptedEvent(const CPmxEvent&)
         void deliver() override {}
     };
     CPmxSessionMessage* message = new (std::nothrow) CPmxCommandAcceptedEventMessage();
-    if (message == 0) {
+    if (message == nullptr) {
         logLostMessage(this);
         return;
     }
@@ -84,7 +84,7 @@ void CPmxSession::notifyErrorOccuredEvent(const CPmxEvent& event)
         CPmxEvent m_cEvent;
     };
     CPmxSessionMessage* message = new (std::nothrow) CPmxCommandErrorEventMessage(event);
-    if (message == 0) {
+    if (message == nullptr) {
         logLostMessage(this);
         return;
     }
@@ -117,7 +117,7 @@ void CPmxSession::notifyDeviceChangedEvent(const CPmxEvent&)
     if (removed) {
         m_bSensorRemoved = true;
         CPmxSessionMessage* message = new (std::nothrow) CPmxSensorRemovedMessage();
-        if (message == 0) {
+        if (message == nullptr) {
             logLostMessage(this);
         } else {
             m_cMessageQueue.push(message, 0);

@@ -5,7 +5,8 @@
 // delivered for viScanf / viBufRead; it keeps unread bytes for the next call unless its mode is
 // VI_FLUSH_ON_ACCESS. A read that ends with END or the termination character ends a message.
 // Every operation of a session runs under that session's lock.
-#pragma once
+#ifndef LBVISAHOST_BUFFEREDIO_H
+#define LBVISAHOST_BUFFEREDIO_H
 
 #include <map>
 #include <memory>
@@ -78,3 +79,5 @@ class CSessionIo {
 };
 
 }  // namespace LbVisaHost
+
+#endif

@@ -6,7 +6,8 @@
 // count of elements from the argument list), modifiers h l ll L z Z, codes d i o u x X e E f
 // g G s c b B y t T [ %. "%[set]" / "%[^set]" carry their character set. Bad syntax throws
 // CFormatError; parsing is linear in the length of the format.
-#pragma once
+#ifndef LBVISAHOST_FORMATPARSER_H
+#define LBVISAHOST_FORMATPARSER_H
 
 #include <stdexcept>
 #include <string>
@@ -51,3 +52,5 @@ const int g_nMaxFormatCount = 1 << 24;
 std::vector<SFormatItem> parseFormat(const std::string &strFormat, bool bScan);
 
 }  // namespace LbVisaHost
+
+#endif

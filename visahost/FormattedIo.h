@@ -4,7 +4,8 @@
 // comma-separated; binary blocks ("%b") are IEEE 488.2 definite-length blocks ("%B" indefinite,
 // "#0" up to the end of the message), "%y" raw binary; both big-endian unless "!ol".
 // Bad formats answer VI_ERROR_INV_FMT, null argument pointers VI_ERROR_USER_BUF.
-#pragma once
+#ifndef LBVISAHOST_FORMATTEDIO_H
+#define LBVISAHOST_FORMATTEDIO_H
 
 #include <cstdarg>
 #include <string>
@@ -43,3 +44,5 @@ size_t binaryElementSize(const std::string &strModifier);
 bool swapsBytes(bool bLittleEndianData, size_t nSize);
 
 }  // namespace LbVisaHost
+
+#endif

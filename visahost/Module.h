@@ -1,6 +1,7 @@
 // Finding and loading passport modules; one implementation per platform
 // (Module_posix.cpp: dlopen, Module_win32.cpp: LoadLibrary and the registry).
-#pragma once
+#ifndef LBVISAHOST_MODULE_H
+#define LBVISAHOST_MODULE_H
 
 #include <string>
 #include <vector>
@@ -25,3 +26,5 @@ bool load(const std::string &strPath, std::string &strError);
 
 }  // namespace Module
 }  // namespace LbVisaHost
+
+#endif

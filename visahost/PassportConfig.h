@@ -6,7 +6,8 @@
 //     the runtime lives in (/etc for the prefixes /usr and /);
 //  3. nothing configured: the default passport beside the runtime's libraries.
 // A path without a folder is looked up beside the runtime's libraries (Runtime.cpp does that).
-#pragma once
+#ifndef LBVISAHOST_PASSPORTCONFIG_H
+#define LBVISAHOST_PASSPORTCONFIG_H
 
 #include <string>
 #include <vector>
@@ -38,3 +39,5 @@ std::vector<std::string> readConfigDirectory(const std::string &strDir,
 
 }  // namespace PassportConfig
 }  // namespace LbVisaHost
+
+#endif

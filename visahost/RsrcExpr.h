@@ -5,7 +5,8 @@
 // "ATTRIBUTE op value" (op ==, !=, <, >, <=, >=; value a number or a quoted string that is a
 // regular expression for == and !=) joined by &&, ||, ! and parentheses.
 // Every constructor throws CRsrcExpr::CInvalidExpression on bad syntax.
-#pragma once
+#ifndef LBVISAHOST_RSRCEXPR_H
+#define LBVISAHOST_RSRCEXPR_H
 
 #include <functional>
 #include <string>
@@ -45,3 +46,5 @@ class CRsrcExpr {
 };
 
 }  // namespace LbVisaHost
+
+#endif

@@ -13,7 +13,8 @@
 //   passport never sees an operation on a session it has already closed.
 // - The object lives until the process ends (it is never destroyed), so passports may call
 //   services from their unload code.
-#pragma once
+#ifndef LBVISAHOST_RUNTIME_H
+#define LBVISAHOST_RUNTIME_H
 
 #include <condition_variable>
 #include <deque>
@@ -184,3 +185,5 @@ class CRuntime {
 bool statusText(ViStatus nStatus, std::string &strText);
 
 }  // namespace LbVisaHost
+
+#endif

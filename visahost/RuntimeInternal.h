@@ -1,7 +1,8 @@
 // Helpers the runtime's source files share: the signatures of vector-table operations, text
 // and value copies, the per-thread record of calls in progress, waiting on a condition variable
 // under g_aRuntimeMutex, and the routing of an operation to a session's vector table.
-#pragma once
+#ifndef LBVISAHOST_RUNTIMEINTERNAL_H
+#define LBVISAHOST_RUNTIMEINTERNAL_H
 
 #include <chrono>
 #include <condition_variable>
@@ -109,3 +110,5 @@ ViStatus CRuntime::route(ViSession nVi, const char *szOp, bool bNeedsAccess, A..
 }
 
 }  // namespace LbVisaHost
+
+#endif

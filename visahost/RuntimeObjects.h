@@ -1,7 +1,8 @@
 // The runtime's objects, one record per kind: resource managers, sessions, find lists and
 // event contexts. Every handle names one record in CRuntime's object map; the records' mutable
 // fields are guarded by g_aRuntimeMutex, the one mutex of the runtime's state.
-#pragma once
+#ifndef LBVISAHOST_RUNTIMEOBJECTS_H
+#define LBVISAHOST_RUNTIMEOBJECTS_H
 
 #include <condition_variable>
 #include <deque>
@@ -119,3 +120,5 @@ std::shared_ptr<T> as(const PObject &pc, EKind eKind) {
 }
 
 }  // namespace LbVisaHost
+
+#endif

@@ -2,7 +2,8 @@
 // Windows, by the names below elsewhere) and the entry through which the VISA C API library
 // reaches the runtime. The argument lists are the binary contract with passports; visahost/
 // README.md describes each service.
-#pragma once
+#ifndef LBVISAHOST_SERVICES_H
+#define LBVISAHOST_SERVICES_H
 
 #include "visahost/include/visa.h"
 
@@ -83,3 +84,5 @@ struct LbVisaHostApi {
 
 LBVISAHOST_EXPORT const LbVisaHostApi *_VI_FUNC lbVisaHostApi(void);
 }
+
+#endif

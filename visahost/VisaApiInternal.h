@@ -1,6 +1,7 @@
 // What the VISA C library's source files share: the runtime's entry and the answer of an
 // operation these resources do not offer.
-#pragma once
+#ifndef LBVISAHOST_VISAAPIINTERNAL_H
+#define LBVISAHOST_VISAAPIINTERNAL_H
 
 #include "visahost/Services.h"
 
@@ -20,3 +21,5 @@ inline ViStatus unsupported(ViObject nVi) {
 }
 
 }  // namespace LbVisaHost
+
+#endif

@@ -7,7 +7,8 @@
 // the expression times the length of the string, whatever the expression.
 // The constructor throws CInvalidExpression on bad syntax, and on groups nested deeper than
 // g_nMaxRegexNesting.
-#pragma once
+#ifndef LBVISAHOST_VISAREGEX_H
+#define LBVISAHOST_VISAREGEX_H
 
 #include <bitset>
 #include <cstddef>
@@ -44,3 +45,5 @@ class CVisaRegex {
 };
 
 }  // namespace LbVisaHost
+
+#endif

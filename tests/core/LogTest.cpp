@@ -75,7 +75,7 @@ std::vector<std::string> readLines(const std::string& path)
 
 int localHour()
 {
-    std::time_t now = std::time(0);
+    std::time_t now = std::time(nullptr);
     return std::localtime(&now)->tm_hour;
 }
 
@@ -171,10 +171,10 @@ TEST_F(CLogTest, AttachRefusesDuplicatesAndEmptyManagerAppendsNothing)
 
 TEST_F(CLogTest, MissingParentsThrow)
 {
-    CLogger orphan(0, "COrphan");
+    CLogger orphan(nullptr, "COrphan");
     EXPECT_THROW(orphan.info(), std::runtime_error);
     try {
-        CLogMessage message(0, LEVEL_ERROR);
+        CLogMessage message(nullptr, LEVEL_ERROR);
         FAIL() << "a message without logger was built";
     } catch (const std::runtime_error& e) {
         EXPECT_STREQ("NULL pointer m_pcParent", e.what());

@@ -36,7 +36,7 @@ TEST(CMemoryPoolTest, ManagedObjectsComeAndGoFromSeveralThreads)
             for (int i = 0; i < kObjects; ++i) {
                 CManaged* made = (i % 3 == 0) ? new (std::nothrow) CManaged(t) : new CManaged(t);
                 ASSERT_NE(nullptr, made);
-                CManaged* old = 0;
+                CManaged* old = nullptr;
                 {
                     std::lock_guard<std::mutex> lock(mutex);
                     shared.push_back(made);

@@ -15,10 +15,10 @@ namespace {
 const unsigned kInfinite = CSemaphore::INFINITE_WAIT;
 
 struct CItem {
-    explicit CItem(int value, std::atomic<int>* deletions = 0) : m_nValue(value), m_pnDeletions(deletions) {}
+    explicit CItem(int value, std::atomic<int>* deletions = nullptr) : m_nValue(value), m_pnDeletions(deletions) {}
     virtual ~CItem()
     {
-        if (m_pnDeletions != 0) {
+        if (m_pnDeletions != nullptr) {
             ++*m_pnDeletions;
         }
     }
@@ -28,7 +28,7 @@ struct CItem {
 
 int popValue(CQueue<CItem>& queue, unsigned timeoutMs = 0)
 {
-    CItem* item = 0;
+    CItem* item = nullptr;
     int result = queue.pop(item, timeoutMs);
     if (result != 0) {
         return -result;
@@ -56,10 +56,10 @@ TEST(CQueueTest, ThirdPushIntoCapacityTwoIsAcceptedAndOrderIsKept)
 TEST(CQueueTest, PopOnAnEmptyQueueTimesOut)
 {
     CQueue<CItem> queue(2);
-    CItem* item = 0;
+    CItem* item = nullptr;
     EXPECT_EQ(1, queue.pop(item, 0));
     EXPECT_EQ(1, queue.pop(item, 30));
-    EXPECT_EQ(0, item);
+    EXPECT_EQ(nullptr, item);
 }
 
 TEST(CQueueTest, InterruptIsServedBeforeQueuedItems)
@@ -68,9 +68,9 @@ TEST(CQueueTest, InterruptIsServedBeforeQueuedItems)
     queue.push(new CItem(1), 0);
     queue.push(new CItem(2), 0);
     EXPECT_EQ(0, queue.interrupt());
-    CItem* item = 0;
+    CItem* item = nullptr;
     EXPECT_EQ(2, queue.pop(item, 0));
-    EXPECT_EQ(0, item);
+    EXPECT_EQ(nullptr, item);
     EXPECT_EQ(2u, queue.size());
     EXPECT_EQ(1, popValue(queue));
     EXPECT_EQ(2, popValue(queue));

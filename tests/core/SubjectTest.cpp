@@ -84,7 +84,7 @@ TEST(CSubjectTest, ResultDiffersFromDefaultWhenAnyObserverDiffers)
     subject.attach(no);
     EXPECT_TRUE(subject.notify(0));
 
-    CBoolSubject withoutMember(0, true);
+    CBoolSubject withoutMember(nullptr, true);
     withoutMember.attach(no);
     calls.clear();
     EXPECT_TRUE(withoutMember.notify(0));
@@ -119,7 +119,7 @@ TEST(CParentTest, NullParentThrows)
     int owner = 4;
     EXPECT_EQ(&owner, CParent<int>(&owner).getParent());
     try {
-        CParent<int>(0).getParent();
+        CParent<int>(nullptr).getParent();
         FAIL() << "getParent() on a null parent did not throw";
     } catch (const std::runtime_error& e) {
         EXPECT_STREQ("NULL pointer m_pcParent", e.what());

@@ -45,7 +45,7 @@ public:
         if (m_bSpin) {
             return true;
         }
-        CMessage* message = 0;
+        CMessage* message = nullptr;
         int result = m_cQueue.pop(message, kInfinite);
         delete message;
         return result == 0;

@@ -46,13 +46,13 @@ std::string askModule(const std::string& name, unsigned parts[4])
     TModuleVersion function = reinterpret_cast<TModuleVersion>(reinterpret_cast<void*>(GetProcAddress(module, "lbTestModuleVersion")));
 #else
     void* module = dlopen(path.c_str(), RTLD_NOW | RTLD_LOCAL);
-    if (module == 0) {
+    if (module == nullptr) {
         return "cannot load " + path;
     }
     TModuleVersion function = reinterpret_cast<TModuleVersion>(dlsym(module, "lbTestModuleVersion"));
 #endif
     std::string result = "no lbTestModuleVersion";
-    if (function != 0) {
+    if (function != nullptr) {
         result = function(parts, failure, sizeof(failure)) ? "" : failure;
     }
 #ifdef _WIN32

@@ -16,8 +16,8 @@ protected:
     void TearDown() override
     {
         std::remove(m_sLog.c_str());
-        setConfiguration("LOG_LEVEL", 0);
-        setConfiguration("LOG_FILE", 0);
+        setConfiguration("LOG_LEVEL", nullptr);
+        setConfiguration("LOG_FILE", nullptr);
     }
 
     // Runs the probe with the given configuration; returns the log file's text ("" if none).
@@ -55,7 +55,7 @@ TEST_F(Configuration, LevelTextsAreExact)
     EXPECT_EQ("<no file>", runProbe("debug", m_sLog));
     EXPECT_EQ("<no file>", runProbe("DEBUG ", m_sLog));
     EXPECT_EQ("<no file>", runProbe("NONE", m_sLog));
-    EXPECT_EQ("<no file>", runProbe(0, m_sLog));
+    EXPECT_EQ("<no file>", runProbe(nullptr, m_sLog));
 }
 
 TEST_F(Configuration, LogFilePathsLongerThan79CharactersAreIgnored)

@@ -148,8 +148,8 @@ TEST_F(Lifecycle, ProcessesEndCleanlyWithSessionsOpen)
             ASSERT_EQ(0, std::system((probe + mode).c_str())) << mode << " run " << run;
         }
     }
-    setConfiguration("LOG_LEVEL", 0);
-    setConfiguration("LOG_FILE", 0);
+    setConfiguration("LOG_LEVEL", nullptr);
+    setConfiguration("LOG_FILE", nullptr);
     // The detach closed the sessions before it detached the adapter.
     EXPECT_EQ(std::string::npos, readFile(log).find("Commands interface will be detached, when still some sessions are open. "));
     EXPECT_NE(std::string::npos, readFile(log).find("Session closed successfully"));

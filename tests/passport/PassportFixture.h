@@ -2,7 +2,8 @@
 // passport LbViPmx64 beside it, which drives the simulated sensor library. Logging is configured
 // (DEBUG into a file of the test's own) before the runtime loads the passport, so tests can
 // look for the passport's log lines.
-#pragma once
+#ifndef LBTESTS_PASSPORT_PASSPORTFIXTURE_H
+#define LBTESTS_PASSPORT_PASSPORTFIXTURE_H
 
 #include <gtest/gtest.h>
 
@@ -43,7 +44,7 @@ inline void setConfiguration(const char* name, const char* value)
     RegCloseKey(key);
 #else
     std::string variable = std::string("LBVIPMX_") + name;
-    if (value == 0) {
+    if (value == nullptr) {
         unsetenv(variable.c_str());
     } else {
         setenv(variable.c_str(), value, 1);
@@ -123,8 +124,8 @@ public:
         ViSession rm = VI_NULL;
         ViStatus status = viOpenDefaultRM(&rm);
         // Read once at load: later processes must not inherit this configuration.
-        setConfiguration("LOG_LEVEL", 0);
-        setConfiguration("LOG_FILE", 0);
+        setConfiguration("LOG_LEVEL", nullptr);
+        setConfiguration("LOG_FILE", nullptr);
         ASSERT_EQ(VI_SUCCESS, status);
         viClose(rm);
     }
@@ -149,18 +150,18 @@ protected:
         return session;
     }
 
-    static ViStatus write(ViSession session, const std::string& text, ViUInt32* count = 0)
+    static ViStatus write(ViSession session, const std::string& text, ViUInt32* count = nullptr)
     {
         return viWrite(session, reinterpret_cast<ViConstBuf>(text.data()), static_cast<ViUInt32>(text.size()), count);
     }
 
     // Reads one answer; the status goes to *status when given, else it must be VI_SUCCESS.
-    static std::string read(ViSession session, ViUInt32 capacity = 1024, ViStatus* status = 0)
+    static std::string read(ViSession session, ViUInt32 capacity = 1024, ViStatus* status = nullptr)
     {
         std::vector<ViByte> buffer(capacity + 1, 0);
         ViUInt32 count = 0;
         ViStatus result = viRead(session, buffer.data(), capacity, &count);
-        if (status != 0) {
+        if (status != nullptr) {
             *status = result;
         } else {
             EXPECT_EQ(VI_SUCCESS, result);
@@ -184,3 +185,5 @@ protected:
 };
 
 } // namespace LbPassportTest
+
+#endif

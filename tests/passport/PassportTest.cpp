@@ -86,11 +86,11 @@ TEST_F(Sessions, WriteReportsTheWholeCountEvenWithAZeroByteInside)
     ViUInt32 count = 0;
     ASSERT_EQ(VI_SUCCESS, write(session, std::string("*RST\0junk", 9), &count));
     EXPECT_EQ(9u, count);
-    EXPECT_EQ(VI_SUCCESS, write(session, "*RST", 0));
-    EXPECT_EQ(VI_ERROR_INV_PARAMETER, viWrite(session, 0, 4, &count));
-    EXPECT_EQ(VI_ERROR_INV_PARAMETER, viRead(session, 0, 4, &count));
+    EXPECT_EQ(VI_SUCCESS, write(session, "*RST", nullptr));
+    EXPECT_EQ(VI_ERROR_INV_PARAMETER, viWrite(session, nullptr, 4, &count));
+    EXPECT_EQ(VI_ERROR_INV_PARAMETER, viRead(session, nullptr, 4, &count));
     ViUInt16 status = 0;
-    EXPECT_EQ(VI_ERROR_INV_PARAMETER, viReadSTB(session, 0));
+    EXPECT_EQ(VI_ERROR_INV_PARAMETER, viReadSTB(session, nullptr));
     EXPECT_EQ(VI_SUCCESS, viReadSTB(session, &status));
     EXPECT_EQ(VI_ERROR_NSUP_OPER, viTerminate(session, 0, 0));
 }
@@ -195,7 +195,7 @@ TEST_F(Attributes, ReadableWritableAndReadOnly)
     EXPECT_EQ(VI_ERROR_NSUP_ATTR, viSetAttribute(session, VI_ATTR_RSRC_CLASS, 0));
     EXPECT_EQ(VI_ERROR_NSUP_ATTR, viSetAttribute(session, VI_ATTR_MANF_ID, 0));
     EXPECT_EQ(VI_ERROR_NSUP_ATTR, viGetAttribute(session, 0x3FFF0199u, &version));
-    EXPECT_EQ(VI_ERROR_INV_PARAMETER, viGetAttribute(session, VI_ATTR_TMO_VALUE, 0));
+    EXPECT_EQ(VI_ERROR_INV_PARAMETER, viGetAttribute(session, VI_ATTR_TMO_VALUE, nullptr));
 }
 
 class Events : public CPassportTest {};

@@ -217,7 +217,7 @@ TEST_F(DataBuffer, AResultThatDoesNotFitFailsTheReadAndIsDiscarded)
     queueFloats(4, {1.0f, 0.5f});
     EXPECT_THROW(read(27), CPmxDataBuffer::CPmxDataBufferOverFlowException); // 27 bytes + zero needed
     int32_t type = 0;
-    EXPECT_EQ(LbPmxVisa::PMX_NO_FURTHER_RESULT, PmxGetData(session().getHandle(), &type, 0, 0));
+    EXPECT_EQ(LbPmxVisa::PMX_NO_FURTHER_RESULT, PmxGetData(session().getHandle(), &type, nullptr, nullptr));
     queueFloats(4, {1.0f, 0.5f});
     EXPECT_EQ("1.000000e+000,5.000000e-001", read(28));
 }

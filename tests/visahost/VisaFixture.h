@@ -1,6 +1,7 @@
 // Test support: points the runtime at the test passport (beside the test executable) before
 // the first resource manager opens, and gives each test a resource manager of its own.
-#pragma once
+#ifndef LBTESTS_VISAHOST_VISAFIXTURE_H
+#define LBTESTS_VISAHOST_VISAFIXTURE_H
 
 #include <gtest/gtest.h>
 
@@ -42,3 +43,5 @@ class CVisaTest : public ::testing::Test {
 };
 
 }  // namespace LbVisaHostTest
+
+#endif

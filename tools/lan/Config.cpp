@@ -31,7 +31,7 @@ bool parseUnsigned(const std::string& text, unsigned max, unsigned& out)
     if (text.empty() || text.size() > 10 || text.find_first_not_of("0123456789") != std::string::npos) {
         return false;
     }
-    unsigned long value = std::strtoul(text.c_str(), 0, 10);
+    unsigned long value = std::strtoul(text.c_str(), nullptr, 10);
     if (value > max) {
         return false;
     }
@@ -202,7 +202,7 @@ bool CLanLog::open(const std::string& destination)
         return true;
     }
     std::FILE* f = std::fopen(destination.c_str(), "a");
-    if (f == 0) {
+    if (f == nullptr) {
         return false;
     }
     m_pFile = f;
@@ -219,7 +219,7 @@ CLanLog::~CLanLog()
 void CLanLog::line(const char* format, ...)
 {
     char stamp[32];
-    std::time_t now = std::time(0);
+    std::time_t now = std::time(nullptr);
     std::tm tm;
 #if defined(_WIN32)
     localtime_s(&tm, &now);

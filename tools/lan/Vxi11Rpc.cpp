@@ -55,7 +55,7 @@ rpc_msg acceptedReply(std::uint32_t xid, accept_stat stat)
     msg.rm_reply.rp_stat = MSG_ACCEPTED;
     msg.acpted_rply.ar_verf = _null_auth;
     msg.acpted_rply.ar_stat = stat;
-    msg.acpted_rply.ar_results.where = 0;
+    msg.acpted_rply.ar_results.where = nullptr;
     msg.acpted_rply.ar_results.proc = xdrProc(xdr_void);
     return msg;
 }
@@ -110,7 +110,7 @@ bool dispatchCore(XDR& x, std::uint32_t xid, std::uint32_t proc, CIVxi11Device& 
 {
     switch (proc) {
     case 0: // NULLPROC: a ping
-        return replyResult(xid, xdrProc(xdr_void), 0, out);
+        return replyResult(xid, xdrProc(xdr_void), nullptr, out);
     case create_link:
         return answer(x, xid, xdr_Create_LinkParms, xdr_Create_LinkResp, out,
                       [&](Create_LinkParms& a, Create_LinkResp& r) { device.createLink(a, r); });
@@ -123,7 +123,7 @@ bool dispatchCore(XDR& x, std::uint32_t xid, std::uint32_t proc, CIVxi11Device& 
                       [&](Device_ReadParms& a, Device_ReadResp& r) {
                           r.error = device.read(a, data, r.reason);
                           r.data.data_len = static_cast<u_int>(data.size());
-                          r.data.data_val = data.empty() ? 0 : &data[0];
+                          r.data.data_val = data.empty() ? nullptr : &data[0];
                       });
     }
     case device_readstb:
@@ -239,7 +239,7 @@ bool dispatchVxi11(EVxi11Channel channel, const std::vector<std::uint8_t>& recor
     } else if (channel == EVxi11Channel::Core) {
         ok = dispatchCore(x, xid, call.rm_call.cb_proc, device, reply);
     } else if (call.rm_call.cb_proc == 0) {
-        ok = replyResult(xid, xdrProc(xdr_void), 0, reply);
+        ok = replyResult(xid, xdrProc(xdr_void), nullptr, reply);
     } else if (call.rm_call.cb_proc == device_abort) {
         ok = withArgs(x, xid, xdr_Device_Link, reply,
                       [&](Device_Link& lid) { replyError(xid, device.abort(lid), reply); });
