@@ -18,7 +18,7 @@ std::uint64_t contextSwitchCount();
 // Reports "allocs" and "switches" per iteration, counted from construction until report().
 class COperationCounters {
 public:
-    COperationCounters() : m_nAllocations(allocationCount()), m_nSwitches(contextSwitchCount()) {}
+    COperationCounters() : m_nAllocations(allocationCount()), m_nSwitches(contextSwitchCount()) { }
     void report(benchmark::State& state) const
     {
         state.counters["allocs"] = benchmark::Counter(static_cast<double>(allocationCount() - m_nAllocations),

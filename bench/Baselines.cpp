@@ -19,7 +19,7 @@ using LbCore::CSemaphore;
 // which the caller takes: one round trip.
 class CPingPong {
 public:
-    CPingPong() : m_cThread([this] { loop(); }) {}
+    CPingPong() : m_cThread([this] { loop(); }) { }
     ~CPingPong()
     {
         m_bStop = true;
@@ -56,7 +56,7 @@ private:
 // a semaphore (the message queue).
 class CRing {
 public:
-    CRing() : m_cCallbackThread([this] { callbackLoop(); }), m_cWorker([this] { workerLoop(); }) {}
+    CRing() : m_cCallbackThread([this] { callbackLoop(); }), m_cWorker([this] { workerLoop(); }) { }
     ~CRing()
     {
         {
@@ -158,7 +158,7 @@ void BM_ThreadStartJoin(benchmark::State& state)
     class CNothing : public LbCore::CIRunnable {
         bool init() override { return true; }
         bool run() override { return false; }
-        void cleanup() override {}
+        void cleanup() override { }
     };
     CNothing nothing;
     for (auto _ : state) {

@@ -36,13 +36,14 @@ int main(int argc, char** argv)
     unsetenv("LBVIPMX_LOG_LEVEL");
     unsetenv("LBVIPMX_LOG_FILE");
     setenv("PMXSIM_DEVICES", "PMX-M01:100000,PMX-M01:100001,PMX-M01:100002,PMX-M01:100003", 1);
-    if (PmxSimReset() != 0 || PmxSimSetDelays(0, 0) != 0 || viOpenDefaultRM(&LbBench::s_nResourceManager) != VI_SUCCESS) {
+    if (PmxSimReset() != 0 || PmxSimSetDelays(0, 0) != 0 ||
+        viOpenDefaultRM(&LbBench::s_nResourceManager) != VI_SUCCESS) {
         std::fprintf(stderr, "lbpmx_bench: the simulated sensors or the VISA runtime could not be set up\n");
         return 1;
     }
     ViSession keeper = VI_NULL;
-    if (viOpen(LbBench::s_nResourceManager, LbBench::sensorName(LbBench::SENSOR_COUNT - 1).c_str(), VI_NULL, 0, &keeper) !=
-        VI_SUCCESS) {
+    if (viOpen(LbBench::s_nResourceManager, LbBench::sensorName(LbBench::SENSOR_COUNT - 1).c_str(), VI_NULL, 0,
+               &keeper) != VI_SUCCESS) {
         std::fprintf(stderr, "lbpmx_bench: the passport could not open a simulated sensor\n");
         return 1;
     }

@@ -39,7 +39,8 @@ private:
 bool write(ViSession vi, const char* text)
 {
     ViUInt32 count = 0;
-    return viWrite(vi, reinterpret_cast<ViConstBuf>(text), static_cast<ViUInt32>(std::strlen(text)), &count) == VI_SUCCESS;
+    return viWrite(vi, reinterpret_cast<ViConstBuf>(text), static_cast<ViUInt32>(std::strlen(text)), &count) ==
+        VI_SUCCESS;
 }
 
 bool read(ViSession vi, std::vector<ViByte>& buffer, ViUInt32 minimum = 1)
@@ -62,13 +63,12 @@ bool require(benchmark::State& state, bool held, const char* failure)
 bool triggerFetchRead(benchmark::State& state, ViSession vi, std::vector<ViByte>& buffer, ViUInt32 minimum = 1)
 {
     return LB_REQUIRE(state, viAssertTrigger(vi, VI_TRIG_PROT_DEFAULT) == VI_SUCCESS) &&
-           LB_REQUIRE(state, write(vi, "FETCh?")) && LB_REQUIRE(state, read(vi, buffer, minimum));
+        LB_REQUIRE(state, write(vi, "FETCh?")) && LB_REQUIRE(state, read(vi, buffer, minimum));
 }
 
 // Times `step` (true when it succeeded) once per iteration on a session of `sensor`, counting
 // the allocations; a failed step ends the run.
-template <class TStep>
-void timeSteps(benchmark::State& state, int sensor, TStep step)
+template <class TStep> void timeSteps(benchmark::State& state, int sensor, TStep step)
 {
     CSession session(sensor);
     if (!session.isOpen()) {
@@ -77,7 +77,8 @@ void timeSteps(benchmark::State& state, int sensor, TStep step)
     }
     COperationCounters counters;
     for (auto _ : state) {
-        if (!step(session)) break;
+        if (!step(session))
+            break;
     }
     counters.report(state);
 }
@@ -116,7 +117,8 @@ void BM_Trace1024(benchmark::State& state)
     }
     COperationCounters counters;
     for (auto _ : state) {
-        if (!triggerFetchRead(state, session, buffer, 4 * 1024)) break;
+        if (!triggerFetchRead(state, session, buffer, 4 * 1024))
+            break;
     }
     counters.report(state);
     write(session, "*RST");
@@ -140,11 +142,13 @@ void BM_OpenSession(benchmark::State& state)
     COperationCounters counters;
     for (auto _ : state) {
         ViSession vi = VI_NULL;
-        if (!LB_REQUIRE(state, viOpen(resourceManager(), sensorName(0).c_str(), VI_NULL, 0, &vi) == VI_SUCCESS)) break;
+        if (!LB_REQUIRE(state, viOpen(resourceManager(), sensorName(0).c_str(), VI_NULL, 0, &vi) == VI_SUCCESS))
+            break;
         state.PauseTiming();
         ViStatus closed = viClose(vi);
         state.ResumeTiming();
-        if (!LB_REQUIRE(state, closed == VI_SUCCESS)) break;
+        if (!LB_REQUIRE(state, closed == VI_SUCCESS))
+            break;
     }
     counters.report(state);
 }
@@ -159,7 +163,8 @@ void BM_WritesOnSensors(benchmark::State& state)
         return;
     }
     for (auto _ : state) {
-        if (!LB_REQUIRE(state, write(session, "FUNC POWER"))) break;
+        if (!LB_REQUIRE(state, write(session, "FUNC POWER")))
+            break;
     }
     state.SetItemsProcessed(state.iterations());
 }
@@ -196,7 +201,8 @@ void BM_SrqCycle(benchmark::State& state)
     CSession session(2);
     CSrqCounter counter;
     std::vector<ViByte> buffer(256);
-    if (!session.isOpen() || viInstallHandler(session, VI_EVENT_SERVICE_REQ, &CSrqCounter::handler, &counter) != VI_SUCCESS ||
+    if (!session.isOpen() ||
+        viInstallHandler(session, VI_EVENT_SERVICE_REQ, &CSrqCounter::handler, &counter) != VI_SUCCESS ||
         viEnableEvent(session, VI_EVENT_SERVICE_REQ, VI_HNDLR, VI_NULL) != VI_SUCCESS) {
         state.SkipWithError("installing the handler failed");
         return;
@@ -206,7 +212,8 @@ void BM_SrqCycle(benchmark::State& state)
     COperationCounters counters;
     for (auto _ : state) {
         expected += kRequestsPerCycle;
-        if (!triggerFetchRead(state, session, buffer) || !LB_REQUIRE(state, counter.waitFor(expected))) break;
+        if (!triggerFetchRead(state, session, buffer) || !LB_REQUIRE(state, counter.waitFor(expected)))
+            break;
     }
     counters.report(state);
     viDisableEvent(session, VI_EVENT_SERVICE_REQ, VI_HNDLR);

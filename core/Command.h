@@ -6,20 +6,17 @@
 
 namespace LbCore {
 
-template <class Signature, int N>
-class CICommand;
+template <class Signature, int N> class CICommand;
 
-template <class R, class... A, int N>
-class CICommand<R(A...), N> {
+template <class R, class... A, int N> class CICommand<R(A...), N> {
 public:
-    virtual ~CICommand() {}
+    virtual ~CICommand() { }
     virtual R execute(A... arguments) = 0;
 };
 
-template <class Argument, class Result>
-class CISerializer {
+template <class Argument, class Result> class CISerializer {
 public:
-    virtual ~CISerializer() {}
+    virtual ~CISerializer() { }
     virtual Result serialize(Argument argument) const = 0;
 };
 

@@ -23,8 +23,7 @@ private:
     std::atomic<int> m_nDepth; // enters not yet left, to detect destruction while held
 };
 
-template <class T>
-class SCOPED_CAPABILITY CLock : private boost::noncopyable {
+template <class T> class SCOPED_CAPABILITY CLock : private boost::noncopyable {
 public:
     explicit CLock(T& section) ACQUIRE(section) : m_pcSection(&section) { m_pcSection->enter(); }
     virtual ~CLock() RELEASE() { m_pcSection->leave(); }

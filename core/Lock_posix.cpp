@@ -27,7 +27,8 @@ CCriticalSection::CCriticalSection() : m_aSection(), m_nDepth(0)
 CCriticalSection::~CCriticalSection()
 {
     if (m_nDepth.load() > 0) {
-        s_cLogger.error("LbCore::CCriticalSection::~CCriticalSection") << "Deleting a critical section when it's still blocking";
+        s_cLogger.error("LbCore::CCriticalSection::~CCriticalSection")
+            << "Deleting a critical section when it's still blocking";
     }
     pthread_mutex_destroy(mutexOf(m_aSection));
 }

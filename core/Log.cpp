@@ -10,11 +10,16 @@ namespace {
 const char* levelText(ELogLevel level)
 {
     switch (level) {
-    case LEVEL_DEBUG: return "DEBUG";
-    case LEVEL_INFO: return "INFO ";
-    case LEVEL_WARN: return "WARN ";
-    case LEVEL_ERROR: return "ERROR";
-    case LEVEL_FATAL: return "FATAL";
+    case LEVEL_DEBUG:
+        return "DEBUG";
+    case LEVEL_INFO:
+        return "INFO ";
+    case LEVEL_WARN:
+        return "WARN ";
+    case LEVEL_ERROR:
+        return "ERROR";
+    case LEVEL_FATAL:
+        return "FATAL";
     }
     return "?????";
 }
@@ -28,9 +33,15 @@ bool isControl(char character)
 void appendEscaped(std::string& line, char character)
 {
     switch (character) {
-    case '\n': line += "\\n"; return;
-    case '\r': line += "\\r"; return;
-    case '\t': line += "\\t"; return;
+    case '\n':
+        line += "\\n";
+        return;
+    case '\r':
+        line += "\\r";
+        return;
+    case '\t':
+        line += "\\t";
+        return;
     }
     static const char s_acDigits[] = "0123456789abcdef";
     unsigned char byte = static_cast<unsigned char>(character);
@@ -71,9 +82,9 @@ std::streamsize CLogText::xsputn(const char* text, std::streamsize count)
 
 // ---- CLogManager
 
-CLogManager::CLogManager() : m_eLevel(LEVEL_DEBUG), m_nAppenders(0), m_cAppenders(&CILogAppender::append, false) {}
+CLogManager::CLogManager() : m_eLevel(LEVEL_DEBUG), m_nAppenders(0), m_cAppenders(&CILogAppender::append, false) { }
 
-CLogManager::~CLogManager() {}
+CLogManager::~CLogManager() { }
 
 CLogManager& CLogManager::getInstance()
 {
@@ -159,19 +170,49 @@ bool CLogFileAppender::append(const CLogMessage& message)
 
 // ---- CLogger
 
-CLogger::CLogger(CLogManager* manager, const std::string& name) : CParent<CLogManager>(manager), m_sName(name) {}
+CLogger::CLogger(CLogManager* manager, const std::string& name) : CParent<CLogManager>(manager), m_sName(name) { }
 
-CLogMessage CLogger::debug() { return CLogMessage(this, LEVEL_DEBUG); }
-CLogMessage CLogger::info() { return CLogMessage(this, LEVEL_INFO); }
-CLogMessage CLogger::warn() { return CLogMessage(this, LEVEL_WARN); }
-CLogMessage CLogger::error() { return CLogMessage(this, LEVEL_ERROR); }
-CLogMessage CLogger::fatal() { return CLogMessage(this, LEVEL_FATAL); }
+CLogMessage CLogger::debug()
+{
+    return CLogMessage(this, LEVEL_DEBUG);
+}
+CLogMessage CLogger::info()
+{
+    return CLogMessage(this, LEVEL_INFO);
+}
+CLogMessage CLogger::warn()
+{
+    return CLogMessage(this, LEVEL_WARN);
+}
+CLogMessage CLogger::error()
+{
+    return CLogMessage(this, LEVEL_ERROR);
+}
+CLogMessage CLogger::fatal()
+{
+    return CLogMessage(this, LEVEL_FATAL);
+}
 
-CLogMessage CLogger::debug(const char* operation) { return begin(LEVEL_DEBUG, operation); }
-CLogMessage CLogger::info(const char* operation) { return begin(LEVEL_INFO, operation); }
-CLogMessage CLogger::warn(const char* operation) { return begin(LEVEL_WARN, operation); }
-CLogMessage CLogger::error(const char* operation) { return begin(LEVEL_ERROR, operation); }
-CLogMessage CLogger::fatal(const char* operation) { return begin(LEVEL_FATAL, operation); }
+CLogMessage CLogger::debug(const char* operation)
+{
+    return begin(LEVEL_DEBUG, operation);
+}
+CLogMessage CLogger::info(const char* operation)
+{
+    return begin(LEVEL_INFO, operation);
+}
+CLogMessage CLogger::warn(const char* operation)
+{
+    return begin(LEVEL_WARN, operation);
+}
+CLogMessage CLogger::error(const char* operation)
+{
+    return begin(LEVEL_ERROR, operation);
+}
+CLogMessage CLogger::fatal(const char* operation)
+{
+    return begin(LEVEL_FATAL, operation);
+}
 
 CLogMessage CLogger::begin(ELogLevel level, const char* operation)
 {

@@ -29,20 +29,14 @@
 namespace LbCore {
 
 // Log levels; the enumerators carry a prefix because Windows headers define ERROR as a macro.
-enum ELogLevel {
-    LEVEL_DEBUG = 0,
-    LEVEL_INFO = 1,
-    LEVEL_WARN = 2,
-    LEVEL_ERROR = 3,
-    LEVEL_FATAL = 4
-};
+enum ELogLevel { LEVEL_DEBUG = 0, LEVEL_INFO = 1, LEVEL_WARN = 2, LEVEL_ERROR = 3, LEVEL_FATAL = 4 };
 
 class CLogMessage;
 class CLogger;
 
 class CILogAppender {
 public:
-    virtual ~CILogAppender() {}
+    virtual ~CILogAppender() { }
     // True when the line was written.
     virtual bool append(const CLogMessage& message) = 0;
 };
@@ -112,7 +106,7 @@ private:
 // bytes, the backslash included, are written as they are.
 class CLogText : private std::streambuf, public std::ostream {
 public:
-    CLogText() : std::ostream(static_cast<std::streambuf*>(this)) {}
+    CLogText() : std::ostream(static_cast<std::streambuf*>(this)) { }
     const std::string& str() const { return m_sText; }
 
 private:
@@ -138,8 +132,7 @@ public:
 
     // Streams a value with the stream's default formatting; an exception streams its what()
     // text and an object that serializes itself into log messages writes itself.
-    template <class T>
-    CLogMessage& operator<<(const T& value)
+    template <class T> CLogMessage& operator<<(const T& value)
     {
         if (!isEnabled() || !m_pcText) {
             return *this;

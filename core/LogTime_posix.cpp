@@ -13,8 +13,8 @@ namespace {
 locale_t environmentLocale()
 {
     static locale_t s_aLocale = [] {
-        locale_t locale = newlocale(LC_TIME_MASK, "", (locale_t)nullptr);
-        return locale != (locale_t)nullptr ? locale : newlocale(LC_TIME_MASK, "C", (locale_t)nullptr);
+        locale_t locale = newlocale(LC_TIME_MASK, "", (locale_t) nullptr);
+        return locale != (locale_t) nullptr ? locale : newlocale(LC_TIME_MASK, "C", (locale_t) nullptr);
     }();
     return s_aLocale;
 }

@@ -18,7 +18,8 @@ void* CMemoryPool::allocate(std::size_t size, int, int, int)
 {
     void* pointer = std::malloc(size == 0 ? 1 : size);
     if (pointer == nullptr) {
-        s_cLogger.error("LbCore::CMemoryPool::allocate") << "Could not allocate " << static_cast<unsigned long long>(size) << " bytes";
+        s_cLogger.error("LbCore::CMemoryPool::allocate")
+            << "Could not allocate " << static_cast<unsigned long long>(size) << " bytes";
     }
     return pointer;
 }

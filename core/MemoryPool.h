@@ -12,7 +12,7 @@ class CMemoryPool {
 public:
     class CMemoryPoolManaged {
     public:
-        virtual ~CMemoryPoolManaged() {}
+        virtual ~CMemoryPoolManaged() { }
         static void* operator new(std::size_t size);
         static void* operator new(std::size_t size, const std::nothrow_t&) noexcept;
         static void operator delete(void* pointer) noexcept;
@@ -26,7 +26,7 @@ public:
     void free(void* pointer);
 
 private:
-    CMemoryPool() {}
+    CMemoryPool() { }
 };
 
 } // namespace LbCore

@@ -7,11 +7,10 @@
 
 namespace LbCore {
 
-template <class T>
-class CParent {
+template <class T> class CParent {
 public:
-    explicit CParent(T* parent) : m_pcParent(parent) {}
-    virtual ~CParent() {}
+    explicit CParent(T* parent) : m_pcParent(parent) { }
+    virtual ~CParent() { }
 
     T* getParent() const
     {

@@ -15,12 +15,11 @@
 
 namespace LbCore {
 
-template <class T>
-class CQueue : public CMemoryPool::CMemoryPoolManaged {
+template <class T> class CQueue : public CMemoryPool::CMemoryPoolManaged {
 public:
     enum EResult { RESULT_ITEM = 0, RESULT_TIMEOUT = 1, RESULT_INTERRUPTED = 2 };
 
-    explicit CQueue(unsigned capacity) : m_cFree(capacity), m_cItems(0), m_nCount(0), m_nInterrupts(0) {}
+    explicit CQueue(unsigned capacity) : m_cFree(capacity), m_cItems(0), m_nCount(0), m_nInterrupts(0) { }
 
     ~CQueue() override
     {

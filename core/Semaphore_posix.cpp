@@ -47,8 +47,7 @@ bool CSemaphore::wait(unsigned timeoutMs)
     sem_t* semaphore = semOf(m_aSemaphore);
     int result;
     if (timeoutMs == INFINITE_WAIT) {
-        while ((result = sem_wait(semaphore)) != 0 && errno == EINTR) {
-        }
+        while ((result = sem_wait(semaphore)) != 0 && errno == EINTR) { }
     } else if (timeoutMs == 0) {
         result = sem_trywait(semaphore);
     } else {
@@ -60,8 +59,7 @@ bool CSemaphore::wait(unsigned timeoutMs)
             deadline.tv_sec += 1;
             deadline.tv_nsec -= 1000000000L;
         }
-        while ((result = sem_clockwait(semaphore, CLOCK_MONOTONIC, &deadline)) != 0 && errno == EINTR) {
-        }
+        while ((result = sem_clockwait(semaphore, CLOCK_MONOTONIC, &deadline)) != 0 && errno == EINTR) { }
         if (result == 0) {
             LB_TSAN_ACQUIRE(semaphore);
         }
@@ -79,8 +77,8 @@ void CSemaphore::release(unsigned count)
     sem_t* semaphore = semOf(m_aSemaphore);
     int value = 0;
     // The same limit as a Win32 semaphore of maximum 0x7FFFFFFF: nothing is added past it.
-    if (sem_getvalue(semaphore, &value) != 0 || count > MAX_COUNT
-        || static_cast<unsigned long long>(value < 0 ? 0 : value) + count > MAX_COUNT) {
+    if (sem_getvalue(semaphore, &value) != 0 || count > MAX_COUNT ||
+        static_cast<unsigned long long>(value < 0 ? 0 : value) + count > MAX_COUNT) {
         throw std::runtime_error("::ReleaseSemaphore failed");
     }
     for (unsigned i = 0; i < count; ++i) {

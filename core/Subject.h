@@ -14,10 +14,9 @@
 
 namespace LbCore {
 
-template <class T>
-class CSubjectBase {
+template <class T> class CSubjectBase {
 public:
-    CSubjectBase() : m_bNotify(true) {}
+    CSubjectBase() : m_bNotify(true) { }
     virtual ~CSubjectBase()
     {
         CLock<CCriticalSection> lock(m_cLock);
@@ -55,15 +54,13 @@ protected:
     std::vector<T*> m_cObservers GUARDED_BY(m_cLock);
 };
 
-template <class T, class Signature>
-class CSubject;
+template <class T, class Signature> class CSubject;
 
-template <class T, class R, class A>
-class CSubject<T, R(A)> : public CSubjectBase<T> {
+template <class T, class R, class A> class CSubject<T, R(A)> : public CSubjectBase<T> {
 public:
     typedef R (T::*Member)(A);
 
-    explicit CSubject(Member member, R defaultResult = R()) : m_pfMember(member), m_cDefault(defaultResult) {}
+    explicit CSubject(Member member, R defaultResult = R()) : m_pfMember(member), m_cDefault(defaultResult) { }
 
     R notify(A argument) { return notify(argument, m_pfMember); }
 
@@ -88,12 +85,11 @@ private:
     R m_cDefault;
 };
 
-template <class T, class A>
-class CSubject<T, void(A)> : public CSubjectBase<T> {
+template <class T, class A> class CSubject<T, void(A)> : public CSubjectBase<T> {
 public:
     typedef void (T::*Member)(A);
 
-    explicit CSubject(Member member = nullptr) : m_pfMember(member) {}
+    explicit CSubject(Member member = nullptr) : m_pfMember(member) { }
 
     void notify(A argument) { notify(argument, m_pfMember); }
 

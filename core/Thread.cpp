@@ -51,8 +51,7 @@ int CThread::start()
     }
     // That thread's end signal is left over when join() found it idle; it must not end a
     // join() of the new thread.
-    while (m_cFinished.wait(0)) {
-    }
+    while (m_cFinished.wait(0)) { }
     void* handle = nullptr;
     std::uint32_t id = 0;
     if (!ThreadPlatform::create(&CThread::threadMain, this, handle, id)) {
@@ -134,8 +133,7 @@ unsigned CThread::threadMain(void* self)
 // A hook that lets an exception escape ends the loop as if run() had returned false; the
 // exception is logged at ERROR so that nothing is lost silently and the process goes on.
 namespace {
-template <class F>
-bool guarded(const char* hook, F call)
+template <class F> bool guarded(const char* hook, F call)
 {
     try {
         return call();
@@ -153,8 +151,7 @@ void CThread::work()
     bool initialised = guarded("init()", [this] { return m_pcRunnable->init(); });
     m_cStarted.release(1);
     if (initialised) {
-        while (getState() == STATE_RUNNING && guarded("run()", [this] { return m_pcRunnable->run(); })) {
-        }
+        while (getState() == STATE_RUNNING && guarded("run()", [this] { return m_pcRunnable->run(); })) { }
     }
     if (getState() == STATE_STOPPING) {
         m_cStopHandshake.wait();

@@ -23,7 +23,7 @@ namespace LbCore {
 
 class CIRunnable {
 public:
-    virtual ~CIRunnable() {}
+    virtual ~CIRunnable() { }
     virtual bool init() = 0;
     virtual bool run() = 0;
     virtual void cleanup() = 0;
@@ -65,7 +65,7 @@ public:
 private:
     bool init() override { return true; }
     bool run() override { return false; }
-    void cleanup() override {}
+    void cleanup() override { }
 
     void work();
     void setState(int state);

@@ -48,7 +48,7 @@ bool create(unsigned (*entry)(void*), void* argument, void*& handle, std::uint32
     bool initialised = pthread_attr_init(&attributes) == 0;
     long minimum = sysconf(_SC_THREAD_STACK_MIN);
     bool small = initialised &&
-                 pthread_attr_setstacksize(&attributes, std::max<std::size_t>(STACK_SIZE, minimum > 0 ? minimum : 0)) == 0;
+        pthread_attr_setstacksize(&attributes, std::max<std::size_t>(STACK_SIZE, minimum > 0 ? minimum : 0)) == 0;
     // A platform that refuses the small stack (for instance for a large static TLS block)
     // still gets its thread, with the default stack.
     int created = small ? pthread_create(&thread, &attributes, &trampoline, start) : EINVAL;
@@ -88,7 +88,8 @@ bool CThread::terminate()
     if (getState() == STATE_IDLE) {
         return false;
     }
-    s_cLogger.error("LbCore::CThread::terminate") << "No forced termination on this platform; stopping the thread and waiting for its end";
+    s_cLogger.error("LbCore::CThread::terminate")
+        << "No forced termination on this platform; stopping the thread and waiting for its end";
     stop();
     m_cFinished.wait();
     return true;

@@ -50,7 +50,7 @@ CVersion::CVersion(const std::string& path) : m_pbyFixedInfo(nullptr)
     m_pbyFixedInfo = static_cast<const unsigned char*>(value);
 }
 
-CVersion::~CVersion() {}
+CVersion::~CVersion() { }
 
 const CVersion& CVersion::getModuleVersion()
 {
@@ -83,21 +83,46 @@ std::uint32_t CVersion::getFixedWord(int index) const
     return word;
 }
 
-std::uint16_t CVersion::getFileMajor() const { return static_cast<std::uint16_t>(getFixedWord(2) >> 16); }
-std::uint16_t CVersion::getFileMinor() const { return static_cast<std::uint16_t>(getFixedWord(2) & 0xFFFF); }
-std::uint16_t CVersion::getFileBuild() const { return static_cast<std::uint16_t>(getFixedWord(3) >> 16); }
-std::uint16_t CVersion::getFileRevision() const { return static_cast<std::uint16_t>(getFixedWord(3) & 0xFFFF); }
-std::uint16_t CVersion::getProductMajor() const { return static_cast<std::uint16_t>(getFixedWord(4) >> 16); }
-std::uint16_t CVersion::getProductMinor() const { return static_cast<std::uint16_t>(getFixedWord(4) & 0xFFFF); }
-std::uint16_t CVersion::getProductBuild() const { return static_cast<std::uint16_t>(getFixedWord(5) >> 16); }
-std::uint16_t CVersion::getProductRevision() const { return static_cast<std::uint16_t>(getFixedWord(5) & 0xFFFF); }
+std::uint16_t CVersion::getFileMajor() const
+{
+    return static_cast<std::uint16_t>(getFixedWord(2) >> 16);
+}
+std::uint16_t CVersion::getFileMinor() const
+{
+    return static_cast<std::uint16_t>(getFixedWord(2) & 0xFFFF);
+}
+std::uint16_t CVersion::getFileBuild() const
+{
+    return static_cast<std::uint16_t>(getFixedWord(3) >> 16);
+}
+std::uint16_t CVersion::getFileRevision() const
+{
+    return static_cast<std::uint16_t>(getFixedWord(3) & 0xFFFF);
+}
+std::uint16_t CVersion::getProductMajor() const
+{
+    return static_cast<std::uint16_t>(getFixedWord(4) >> 16);
+}
+std::uint16_t CVersion::getProductMinor() const
+{
+    return static_cast<std::uint16_t>(getFixedWord(4) & 0xFFFF);
+}
+std::uint16_t CVersion::getProductBuild() const
+{
+    return static_cast<std::uint16_t>(getFixedWord(5) >> 16);
+}
+std::uint16_t CVersion::getProductRevision() const
+{
+    return static_cast<std::uint16_t>(getFixedWord(5) & 0xFFFF);
+}
 
 std::string CVersion::getQueryValue(const std::string& key) const
 {
     const CVersionException missing("CVersion::getQueryValue() can't get the value for the key:" + key);
     const void* value = nullptr;
     std::size_t size = 0;
-    if (!queryValue("\\VarFileInfo\\Translation", value, size) || value == nullptr || size < 2 * sizeof(std::uint16_t)) {
+    if (!queryValue("\\VarFileInfo\\Translation", value, size) || value == nullptr ||
+        size < 2 * sizeof(std::uint16_t)) {
         throw missing;
     }
     std::uint16_t translation[2];
@@ -109,8 +134,9 @@ std::string CVersion::getQueryValue(const std::string& key) const
         throw missing;
     }
     char path[255];
-    const int length = std::snprintf(path, sizeof(path), "%s%04x%04x%s%s", "\\StringFileInfo\\",
-                                     static_cast<unsigned>(translation[0]), static_cast<unsigned>(translation[1]), "\\", key.c_str());
+    const int length =
+        std::snprintf(path, sizeof(path), "%s%04x%04x%s%s", "\\StringFileInfo\\", static_cast<unsigned>(translation[0]),
+                      static_cast<unsigned>(translation[1]), "\\", key.c_str());
     if (length < 0 || static_cast<std::size_t>(length) >= sizeof(path)) {
         throw missing;
     }

@@ -30,7 +30,7 @@ class CVersion {
 public:
     class CVersionException : public std::runtime_error {
     public:
-        explicit CVersionException(const std::string& message) : std::runtime_error(message) {}
+        explicit CVersionException(const std::string& message) : std::runtime_error(message) { }
     };
 
     explicit CVersion(const std::string& path);

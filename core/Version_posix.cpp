@@ -90,8 +90,9 @@ bool CVersion::readBlock(const std::string& path)
         if (section.sh_name >= names.sh_size || std::strcmp(&nameTable[section.sh_name], c_szSectionName) != 0) {
             continue;
         }
-        if (section.sh_type == SHT_NOBITS || section.sh_offset > fileSize || section.sh_size > fileSize - section.sh_offset ||
-            section.sh_size < c_nStringsOffset || section.sh_size > c_nMaxSection) {
+        if (section.sh_type == SHT_NOBITS || section.sh_offset > fileSize ||
+            section.sh_size > fileSize - section.sh_offset || section.sh_size < c_nStringsOffset ||
+            section.sh_size > c_nMaxSection) {
             return false;
         }
         m_cBlock.resize(section.sh_size);
@@ -128,7 +129,8 @@ bool CVersion::queryValue(const std::string& path, const void*& value, std::size
     std::uint16_t translation[2];
     std::memcpy(translation, &m_cBlock[c_nTranslationOffset], sizeof(translation));
     char expected[9];
-    std::snprintf(expected, sizeof(expected), "%04x%04x", static_cast<unsigned>(translation[0]), static_cast<unsigned>(translation[1]));
+    std::snprintf(expected, sizeof(expected), "%04x%04x", static_cast<unsigned>(translation[0]),
+                  static_cast<unsigned>(translation[1]));
     if (!equalsIgnoringCase(path.substr(prefix.size(), 8).c_str(), expected)) {
         return false;
     }
@@ -160,7 +162,8 @@ std::string CVersion::getModulePath()
 {
     Dl_info info;
     struct link_map* module = nullptr;
-    if (dladdr1(&s_cModuleAnchor, &info, reinterpret_cast<void**>(&module), RTLD_DL_LINKMAP) == 0 || module == nullptr) {
+    if (dladdr1(&s_cModuleAnchor, &info, reinterpret_cast<void**>(&module), RTLD_DL_LINKMAP) == 0 ||
+        module == nullptr) {
         return std::string();
     }
     if (module->l_name != nullptr && module->l_name[0] != '\0') {

@@ -28,7 +28,11 @@ public:
         reason = LbPmxLan::VXI11_REASON_END;
         return 0;
     }
-    long readStb(const Device_GenericParms&, unsigned char& stb) override { stb = 0; return 0; }
+    long readStb(const Device_GenericParms&, unsigned char& stb) override
+    {
+        stb = 0;
+        return 0;
+    }
     long trigger(const Device_GenericParms&) override { return 0; }
     long clear(const Device_GenericParms&) override { return 0; }
     long lock(const Device_LockParms&) override { return 0; }
@@ -46,7 +50,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
 {
     std::size_t at = 0;
     auto readExact = [&](void* p, std::size_t n) {
-        if (n > size - at) return false;
+        if (n > size - at)
+            return false;
         std::memcpy(p, data + at, n);
         at += n;
         return true;
@@ -56,9 +61,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     std::vector<std::uint8_t> reply;
     LbPmxLan::EVxi11Channel channel = LbPmxLan::EVxi11Channel::Core;
     while (LbPmxLan::readRpcRecord(readExact, LbPmxLan::RPC_MAX_RECORD, record)) {
-        if (!LbPmxLan::dispatchVxi11(channel, record, device, reply)) break;
-        channel = channel == LbPmxLan::EVxi11Channel::Core ? LbPmxLan::EVxi11Channel::Abort
-                                                           : LbPmxLan::EVxi11Channel::Core;
+        if (!LbPmxLan::dispatchVxi11(channel, record, device, reply))
+            break;
+        channel =
+            channel == LbPmxLan::EVxi11Channel::Core ? LbPmxLan::EVxi11Channel::Abort : LbPmxLan::EVxi11Channel::Core;
     }
     LbPmxLan::CLineReader lines;
     lines.feed(reinterpret_cast<const char*>(data), size);

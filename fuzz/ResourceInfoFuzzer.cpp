@@ -24,7 +24,8 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
 
     const std::string::size_type split = input.find('\n');
     try {
-        const CPmxResourceInfo info(input.substr(0, split), split == std::string::npos ? std::string() : input.substr(split + 1));
+        const CPmxResourceInfo info(input.substr(0, split),
+                                    split == std::string::npos ? std::string() : input.substr(split + 1));
         if (CPmxResourceInfo::getModelTable().count(input.substr(0, split)) != 1) {
             std::abort();
         }

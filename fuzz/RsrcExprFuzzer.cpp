@@ -12,25 +12,27 @@
 using LbVisaHost::CRsrcExpr;
 using LbVisaHost::CVisaRegex;
 
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t *data, std::size_t size) {
-  const std::string strInput(reinterpret_cast<const char *>(data), size);
-  const std::string::size_type nSplit = strInput.find('\n');
-  const std::string strExpr = strInput.substr(0, nSplit);
-  const std::string strRsrc = nSplit == std::string::npos ? std::string() : strInput.substr(nSplit + 1);
-  try {
-    CRsrcExpr cExpr(strExpr);
-    cExpr.matches(strRsrc);
-    unsigned nCalls = 0;
-    cExpr.matchesAttributes([&](const LbVisaHost::SAttrCondition &) { return ++nCalls % 2 == 0; });
-  } catch (const CRsrcExpr::CInvalidExpression &) {
-  }
-  if (!strRsrc.empty()) {
-    std::string strEscaped;
-    for (char c : strRsrc) {
-      strEscaped += '\\';
-      strEscaped += c;
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size)
+{
+    const std::string strInput(reinterpret_cast<const char*>(data), size);
+    const std::string::size_type nSplit = strInput.find('\n');
+    const std::string strExpr = strInput.substr(0, nSplit);
+    const std::string strRsrc = nSplit == std::string::npos ? std::string() : strInput.substr(nSplit + 1);
+    try {
+        CRsrcExpr cExpr(strExpr);
+        cExpr.matches(strRsrc);
+        unsigned nCalls = 0;
+        cExpr.matchesAttributes([&](const LbVisaHost::SAttrCondition&) { return ++nCalls % 2 == 0; });
+    } catch (const CRsrcExpr::CInvalidExpression&) {
     }
-    if (!CVisaRegex(strEscaped).matches(strRsrc)) std::abort();
-  }
-  return 0;
+    if (!strRsrc.empty()) {
+        std::string strEscaped;
+        for (char c : strRsrc) {
+            strEscaped += '\\';
+            strEscaped += c;
+        }
+        if (!CVisaRegex(strEscaped).matches(strRsrc))
+            std::abort();
+    }
+    return 0;
 }

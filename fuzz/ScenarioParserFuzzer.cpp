@@ -33,14 +33,13 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
             check(PmxSim::validText(sensor.strType.c_str()));
             check(PmxSim::validText(sensor.strSerial.c_str()));
             check(serials.insert(PmxSim::lower(sensor.strSerial)).second);
-            check(sensor.power.eKind != PmxSim::SPowerModel::eSequence
-                || !sensor.power.levels.empty());
+            check(sensor.power.eKind != PmxSim::SPowerModel::eSequence || !sensor.power.levels.empty());
             for (const PmxSim::SAnswer& answer : sensor.answers)
                 PmxSim::matchesPattern(answer.strPattern.c_str(), input.c_str());
         }
         for (const PmxSim::SFault& fault : scenario.faults)
-            check(fault.nFunction >= 0 && fault.nFunction < PmxSim::kFunctionCount
-                && fault.nCall >= 1 && fault.nCode != 0);
+            check(fault.nFunction >= 0 && fault.nFunction < PmxSim::kFunctionCount && fault.nCall >= 1 &&
+                  fault.nCode != 0);
         check(scenario.nAckMs >= 0 && scenario.nMeasureMs >= 0);
     } else {
         check(scenario.nAckMs == -1 && !reason.empty() && line >= 0);

@@ -9,9 +9,12 @@ namespace LbPmxPassport {
 
 class CBasePassport {
 public:
-    virtual ~CBasePassport() {}
+    virtual ~CBasePassport() { }
     // The five values of the runtime's find callback, passed through unchanged.
-    virtual ViStatus findAttribute(ViAttr, ViUInt16, ViAttrState, ViConstString, ViUInt32) { return VI_ERROR_NSUP_OPER; }
+    virtual ViStatus findAttribute(ViAttr, ViUInt16, ViAttrState, ViConstString, ViUInt32)
+    {
+        return VI_ERROR_NSUP_OPER;
+    }
     virtual ViStatus viClose() { return VI_ERROR_NSUP_OPER; }
     virtual ViStatus viGetAttribute(ViAttr, void*) { return VI_ERROR_NSUP_OPER; }
     virtual ViStatus viSetAttribute(ViAttr, ViAttrState) { return VI_ERROR_NSUP_OPER; }

@@ -23,7 +23,8 @@ ViUInt32 CLbPmxInstrSesn::implementationVersion(const char* buildDate, unsigned 
         }
     }
     unsigned day = date.size() >= 6 ? static_cast<unsigned>(std::strtoul(date.substr(4, 2).c_str(), nullptr, 10)) : 0;
-    unsigned year = date.size() >= 11 ? static_cast<unsigned>(std::strtoul(date.substr(7, 4).c_str(), nullptr, 10)) : 1999;
+    unsigned year =
+        date.size() >= 11 ? static_cast<unsigned>(std::strtoul(date.substr(7, 4).c_str(), nullptr, 10)) : 1999;
     ViUInt32 datecode = (12u * (year - 1999u) + month) * 100u + day;
     return (((major * 16u) + (minor % 16u)) << 20) | ((datecode << 4) & 0xFFFF0u) | 0xFu;
 }

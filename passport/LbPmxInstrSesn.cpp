@@ -52,8 +52,7 @@ struct CStatusMap {
     bool commandCodes; // CPmxCommandException: VI_ERROR_NSUP_OPER for an unknown command
 };
 
-template <class F>
-ViStatus guarded(const char* operation, const CStatusMap& map, F body)
+template <class F> ViStatus guarded(const char* operation, const CStatusMap& map, F body)
 {
     try {
         return body();
@@ -68,7 +67,8 @@ ViStatus guarded(const char* operation, const CStatusMap& map, F body)
         return map.overflow;
     } catch (const CPmxSessionDispatcher::CPmxCommandException& e) {
         logError(operation, e.what());
-        return map.commandCodes && e.getErrorCode() == LbPmxVisa::PMX_UNKNOWN_COMMAND ? VI_ERROR_NSUP_OPER : VI_ERROR_SYSTEM_ERROR;
+        return map.commandCodes && e.getErrorCode() == LbPmxVisa::PMX_UNKNOWN_COMMAND ? VI_ERROR_NSUP_OPER
+                                                                                      : VI_ERROR_SYSTEM_ERROR;
     } catch (const std::exception& e) {
         logError(operation, e.what());
         return VI_ERROR_SYSTEM_ERROR;
@@ -112,8 +112,8 @@ void CLbPmxInstrSesn::CVisaEventListener::raise(ViEventType type)
 // ---- lifecycle
 
 CLbPmxInstrSesn::CLbPmxInstrSesn()
-    : m_nSession(0), m_pcRecord(nullptr), m_nClosed(0), m_nClosingFromDestructor(0),
-      m_cSrqListener(this), m_cUsbListener(this), m_cExceptionListener(this)
+    : m_nSession(0), m_pcRecord(nullptr), m_nClosed(0), m_nClosingFromDestructor(0), m_cSrqListener(this),
+      m_cUsbListener(this), m_cExceptionListener(this)
 {
 }
 
@@ -345,8 +345,7 @@ ViStatus CLbPmxInstrSesn::viFindRsrc(ViSession rm, ViConstString expression, ViP
 // ---- attributes
 
 namespace {
-template <class T>
-void store(void* destination, T value)
+template <class T> void store(void* destination, T value)
 {
     std::memcpy(destination, &value, sizeof value);
 }
@@ -373,7 +372,9 @@ ViStatus CLbPmxInstrSesn::getAttribute(ViAttr attribute, void* value)
     CPmxSession& session = *m_pcSession;
     CPmxSessionDispatcher& dispatcher = CPmxSessionDispatcher::getInstance();
     switch (attribute) {
-    case VI_ATTR_RSRC_CLASS: copyText(static_cast<ViChar*>(value), "INSTR"); break;
+    case VI_ATTR_RSRC_CLASS:
+        copyText(static_cast<ViChar*>(value), "INSTR");
+        break;
     case VI_ATTR_RSRC_NAME:
         copyText(static_cast<ViChar*>(value), LbPmxVisa::g_pcVisaSerializer->serialize(session.getResourceInfo()));
         break;
@@ -382,21 +383,50 @@ ViStatus CLbPmxInstrSesn::getAttribute(ViAttr attribute, void* value)
         store<ViUInt32>(value, implementationVersion(__DATE__, version.getFileMajor(), version.getFileMinor()));
         break;
     }
-    case VI_ATTR_SEND_END_EN: store<ViUInt16>(value, session.getSendEndEnabled()); break;
-    case VI_ATTR_TERMCHAR: store<ViUInt8>(value, session.getTermChar()); break;
-    case VI_ATTR_TMO_VALUE: store<ViUInt32>(value, static_cast<ViUInt32>(session.getTimeout())); break;
-    case VI_ATTR_SUPPRESS_END_EN: store<ViUInt16>(value, session.getSuppressEndEnabled()); break;
-    case VI_ATTR_TERMCHAR_EN: store<ViUInt16>(value, session.getTermCharEnabled()); break;
-    case VI_ATTR_MANF_NAME: copyText(static_cast<ViChar*>(value), dispatcher.getManufacturerName()); break;
-    case VI_ATTR_MANF_ID: store<ViUInt16>(value, static_cast<ViUInt16>(dispatcher.getManufacturerId())); break;
-    case VI_ATTR_INTF_INST_NAME: copyText(static_cast<ViChar*>(value), "pmx0"); break;
-    case VI_ATTR_RSRC_SPEC_VERSION: store<ViUInt32>(value, 0x00400000u); break;
-    case VI_ATTR_RSRC_MANF_NAME: copyText(static_cast<ViChar*>(value), "National Instruments"); break;
-    case VI_ATTR_RSRC_MANF_ID: store<ViUInt16>(value, 0x0FF6); break;
-    case VI_ATTR_USB_SERIAL_NUM: copyText(static_cast<ViChar*>(value), session.getResourceInfo().getSerialNumber()); break;
-    case VI_ATTR_USB_INTFC_NUM: store<ViInt16>(value, 0); break;
-    case VI_ATTR_USB_PROTOCOL: store<ViInt16>(value, 0); break;
-    default: return VI_ERROR_NSUP_ATTR;
+    case VI_ATTR_SEND_END_EN:
+        store<ViUInt16>(value, session.getSendEndEnabled());
+        break;
+    case VI_ATTR_TERMCHAR:
+        store<ViUInt8>(value, session.getTermChar());
+        break;
+    case VI_ATTR_TMO_VALUE:
+        store<ViUInt32>(value, static_cast<ViUInt32>(session.getTimeout()));
+        break;
+    case VI_ATTR_SUPPRESS_END_EN:
+        store<ViUInt16>(value, session.getSuppressEndEnabled());
+        break;
+    case VI_ATTR_TERMCHAR_EN:
+        store<ViUInt16>(value, session.getTermCharEnabled());
+        break;
+    case VI_ATTR_MANF_NAME:
+        copyText(static_cast<ViChar*>(value), dispatcher.getManufacturerName());
+        break;
+    case VI_ATTR_MANF_ID:
+        store<ViUInt16>(value, static_cast<ViUInt16>(dispatcher.getManufacturerId()));
+        break;
+    case VI_ATTR_INTF_INST_NAME:
+        copyText(static_cast<ViChar*>(value), "pmx0");
+        break;
+    case VI_ATTR_RSRC_SPEC_VERSION:
+        store<ViUInt32>(value, 0x00400000u);
+        break;
+    case VI_ATTR_RSRC_MANF_NAME:
+        copyText(static_cast<ViChar*>(value), "National Instruments");
+        break;
+    case VI_ATTR_RSRC_MANF_ID:
+        store<ViUInt16>(value, 0x0FF6);
+        break;
+    case VI_ATTR_USB_SERIAL_NUM:
+        copyText(static_cast<ViChar*>(value), session.getResourceInfo().getSerialNumber());
+        break;
+    case VI_ATTR_USB_INTFC_NUM:
+        store<ViInt16>(value, 0);
+        break;
+    case VI_ATTR_USB_PROTOCOL:
+        store<ViInt16>(value, 0);
+        break;
+    default:
+        return VI_ERROR_NSUP_ATTR;
     }
     return VI_SUCCESS;
 }
@@ -405,18 +435,30 @@ ViStatus CLbPmxInstrSesn::viSetAttribute(ViAttr attribute, ViAttrState value)
 {
     CPmxSession& session = *m_pcSession;
     switch (attribute) {
-    case VI_ATTR_SEND_END_EN: session.setSendEndEnabled(value != 0); break;
-    case VI_ATTR_TERMCHAR: session.setTermChar(static_cast<std::uint8_t>(value & 0xFF)); break;
-    case VI_ATTR_TMO_VALUE: session.setTimeout(value); break;
-    case VI_ATTR_SUPPRESS_END_EN: session.setSuppressEndEnabled(value != 0); break;
-    case VI_ATTR_TERMCHAR_EN: session.setTermCharEnabled(value != 0); break;
+    case VI_ATTR_SEND_END_EN:
+        session.setSendEndEnabled(value != 0);
+        break;
+    case VI_ATTR_TERMCHAR:
+        session.setTermChar(static_cast<std::uint8_t>(value & 0xFF));
+        break;
+    case VI_ATTR_TMO_VALUE:
+        session.setTimeout(value);
+        break;
+    case VI_ATTR_SUPPRESS_END_EN:
+        session.setSuppressEndEnabled(value != 0);
+        break;
+    case VI_ATTR_TERMCHAR_EN:
+        session.setTermCharEnabled(value != 0);
+        break;
     case VI_ATTR_RSRC_IMPL_VERSION:
     case VI_ATTR_RSRC_SPEC_VERSION:
     case VI_ATTR_RSRC_MANF_ID:
     case VI_ATTR_RSRC_NAME:
     case VI_ATTR_INTF_INST_NAME:
-    case VI_ATTR_RSRC_MANF_NAME: return VI_ERROR_ATTR_READONLY;
-    default: return VI_ERROR_NSUP_ATTR;
+    case VI_ATTR_RSRC_MANF_NAME:
+        return VI_ERROR_ATTR_READONLY;
+    default:
+        return VI_ERROR_NSUP_ATTR;
     }
     return VI_SUCCESS;
 }
@@ -426,10 +468,14 @@ ViStatus CLbPmxInstrSesn::viSetAttribute(ViAttr attribute, ViAttrState value)
 LbPmxVisa::CIPmxEventListener* CLbPmxInstrSesn::listenerFor(ViEventType type)
 {
     switch (type) {
-    case VI_EVENT_SERVICE_REQ: return &m_cSrqListener;
-    case VI_EVENT_USB_INTR: return &m_cUsbListener;
-    case VI_EVENT_EXCEPTION: return &m_cExceptionListener;
-    default: return nullptr;
+    case VI_EVENT_SERVICE_REQ:
+        return &m_cSrqListener;
+    case VI_EVENT_USB_INTR:
+        return &m_cUsbListener;
+    case VI_EVENT_EXCEPTION:
+        return &m_cExceptionListener;
+    default:
+        return nullptr;
     }
 }
 

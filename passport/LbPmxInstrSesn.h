@@ -27,14 +27,14 @@ public:
     // Raises one VISA event of a fixed type on the owning session per notification.
     class CVisaEventListener : public LbCore::CParent<CLbPmxInstrSesn>, public LbPmxVisa::CIPmxEventListener {
     public:
-        explicit CVisaEventListener(CLbPmxInstrSesn* owner) : LbCore::CParent<CLbPmxInstrSesn>(owner) {}
+        explicit CVisaEventListener(CLbPmxInstrSesn* owner) : LbCore::CParent<CLbPmxInstrSesn>(owner) { }
         // Unsubscribes from the sensor session's event dispatcher while the owner holds it.
         ~CVisaEventListener() override;
-        void notifyCommandAcceptedEvent(const LbPmxVisa::CPmxEvent&) override {}
-        void notifyDataAvailableEvent(const LbPmxVisa::CPmxEvent&) override {}
-        void notifyErrorOccuredEvent(const LbPmxVisa::CPmxEvent&) override {}
-        void notifyStateChangedEvent(const LbPmxVisa::CPmxEvent&) override {}
-        void notifyDeviceChangedEvent(const LbPmxVisa::CPmxEvent&) override {}
+        void notifyCommandAcceptedEvent(const LbPmxVisa::CPmxEvent&) override { }
+        void notifyDataAvailableEvent(const LbPmxVisa::CPmxEvent&) override { }
+        void notifyErrorOccuredEvent(const LbPmxVisa::CPmxEvent&) override { }
+        void notifyStateChangedEvent(const LbPmxVisa::CPmxEvent&) override { }
+        void notifyDeviceChangedEvent(const LbPmxVisa::CPmxEvent&) override { }
 
     protected:
         void raise(ViEventType type);

@@ -9,9 +9,10 @@ namespace LbPmxPassport {
 bool queryConfigurationValue(const char* name, char (&buffer)[CONFIGURATION_VALUE_SIZE], unsigned& size)
 {
     HKEY key = 0;
-    if (RegOpenKeyExA(HKEY_LOCAL_MACHINE,
-                      "SOFTWARE\\National Instruments\\NI-VISA for Windows 95/NT\\CurrentVersion\\IoLibraries\\LbViPmx.dll", 0,
-                      KEY_QUERY_VALUE, &key) != ERROR_SUCCESS) {
+    if (RegOpenKeyExA(
+            HKEY_LOCAL_MACHINE,
+            "SOFTWARE\\National Instruments\\NI-VISA for Windows 95/NT\\CurrentVersion\\IoLibraries\\LbViPmx.dll", 0,
+            KEY_QUERY_VALUE, &key) != ERROR_SUCCESS) {
         return false;
     }
     DWORD bytes = sizeof buffer;
@@ -28,11 +29,13 @@ bool queryConfigurationValue(const char* name, char (&buffer)[CONFIGURATION_VALU
 extern "C" BOOL WINAPI DllMain(HINSTANCE, DWORD reason, LPVOID reserved)
 {
     switch (reason) {
-    case DLL_PROCESS_ATTACH: return LbPmxPassport::attachProcess() ? TRUE : FALSE;
+    case DLL_PROCESS_ATTACH:
+        return LbPmxPassport::attachProcess() ? TRUE : FALSE;
     case DLL_PROCESS_DETACH:
         LbPmxPassport::detachProcess(reserved != 0 ? LbPmxPassport::DETACH_THREADS_STOPPED
                                                    : LbPmxPassport::DETACH_UNDER_LOADER_LOCK);
         return TRUE;
-    default: return TRUE;
+    default:
+        return TRUE;
     }
 }

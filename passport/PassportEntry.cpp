@@ -41,8 +41,7 @@ CBasePassport* objectOf(ViSession session)
 // Each entry function forwards to the session's object. A handle without an object (never
 // opened, or already closed) answers VI_ERROR_INV_OBJECT instead of touching a null pointer.
 // After detach: VI_ERROR_SYSTEM_ERROR.
-template <class F>
-ViStatus forward(ViSession session, F call)
+template <class F> ViStatus forward(ViSession session, F call)
 {
     if (s_bDetached) {
         return VI_ERROR_SYSTEM_ERROR;
@@ -88,8 +87,7 @@ ViStatus _VI_FUNC entryOpen(ViSession, ViConstRsrc name, ViAccessMode mode, ViUI
     // counted out of the open sensor sessions): the open fails before anything is opened.
     ViAddr* record = CNiViSv::sessionRecord(*session);
     if (record == nullptr) {
-        s_cLogger.error("LbPmxPassport::CLbPmxInstrSesn::viOpen") << "No session record for session "
-                          << *session;
+        s_cLogger.error("LbPmxPassport::CLbPmxInstrSesn::viOpen") << "No session record for session " << *session;
         return VI_ERROR_SYSTEM_ERROR;
     }
     CLbPmxInstrSesn* object = new (std::nothrow) CLbPmxInstrSesn();
@@ -177,15 +175,15 @@ ViStatus _VI_FUNC entryDisableEvent(ViSession session, ViEventType type, ViUInt1
     return forward(session, [&](CBasePassport& o) { return o.viDisableEvent(type, mechanism); });
 }
 
-template <class F>
-CNiViSv::TEntry proc(F function)
+template <class F> CNiViSv::TEntry proc(F function)
 {
     return reinterpret_cast<CNiViSv::TEntry>(reinterpret_cast<void*>(function));
 }
 
 ViStatus registerVectorTable()
 {
-    ViStatus status = CNiViSv::createTable("LbPmxPassport C++ LbPmxInstrSesn Vector Table", 0x00400000, 0, &s_hVectorTable);
+    ViStatus status =
+        CNiViSv::createTable("LbPmxPassport C++ LbPmxInstrSesn Vector Table", 0x00400000, 0, &s_hVectorTable);
     if (status < VI_SUCCESS) {
         return status;
     }
@@ -336,7 +334,8 @@ void readLogFile()
     static std::unique_ptr<LbCore::CLogFileAppender> s_pcAppender;
     char buffer[CONFIGURATION_VALUE_SIZE] = {0};
     unsigned size = 0;
-    if (!queryConfigurationValue("LOG_FILE", buffer, size) || size < 1 || size > CONFIGURATION_VALUE_SIZE || s_pcAppender) {
+    if (!queryConfigurationValue("LOG_FILE", buffer, size) || size < 1 || size > CONFIGURATION_VALUE_SIZE ||
+        s_pcAppender) {
         return;
     }
     s_pcAppender.reset(new LbCore::CLogFileAppender(textOf(buffer, size)));

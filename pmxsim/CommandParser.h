@@ -15,27 +15,27 @@ namespace PmxSim {
 enum EAction {
     eNone,
     eUnknown,
-    eIdn, // *IDN?
-    eReset, // *RST
-    eClearStatus, // *CLS
+    eIdn,               // *IDN?
+    eReset,             // *RST
+    eClearStatus,       // *CLS
     eOperationComplete, // *OPC, *OPC?
-    eEventStatus, // *ESR?
-    eEventEnable, // *ESE, *ESE?
-    eServiceEnable, // *SRE, *SRE?
-    eSelfTest, // *TST?
-    eMeasure, // *TRG, INIT[:IMM]
-    eContinuous, // INIT:CONT
-    eAbort, // ABOR
-    eRead, // READ?: a measurement of the current function
-    eMeasurePower, // MEAS[:POW]?: a power measurement
-    eFunction, // FUNC
-    eTracePoints, // TRAC:POIN
-    eFrequency, // [SENS:]FREQ
-    eAverageCount, // [SENS:]AVER:COUN
-    eAveraging, // [SENS:]AVER[:STAT]
-    eOffset, // [SENS:]CORR:OFFS
-    eUnit, // UNIT:POW
-    eVersion // SYST:VERS?
+    eEventStatus,       // *ESR?
+    eEventEnable,       // *ESE, *ESE?
+    eServiceEnable,     // *SRE, *SRE?
+    eSelfTest,          // *TST?
+    eMeasure,           // *TRG, INIT[:IMM]
+    eContinuous,        // INIT:CONT
+    eAbort,             // ABOR
+    eRead,              // READ?: a measurement of the current function
+    eMeasurePower,      // MEAS[:POW]?: a power measurement
+    eFunction,          // FUNC
+    eTracePoints,       // TRAC:POIN
+    eFrequency,         // [SENS:]FREQ
+    eAverageCount,      // [SENS:]AVER:COUN
+    eAveraging,         // [SENS:]AVER[:STAT]
+    eOffset,            // [SENS:]CORR:OFFS
+    eUnit,              // UNIT:POW
+    eVersion            // SYST:VERS?
 };
 
 // The choices of FUNC and UNIT:POW, as nValue.
@@ -47,7 +47,7 @@ const int32_t kUnitWatt = 1;
 struct SCommand {
     EAction eAction = eUnknown;
     bool bQuery = false;
-    int32_t nValue = 0; // whole numbers, booleans (0, 1) and choices
+    int32_t nValue = 0;  // whole numbers, booleans (0, 1) and choices
     double dValue = 0.0; // frequency in Hz, offset in dB
 };
 

@@ -57,21 +57,18 @@ PMX_API int32_t PmxGetFloatResult(int64_t handle, float* value1, float* value2, 
 }
 PMX_API int32_t PmxGetFloatArray(int64_t handle, float* values, int32_t capacity, int32_t* count)
 {
-    return sim().getFloatArrays(
-        PmxSim::eGetFloatArray, handle, values, nullptr, nullptr, capacity, count);
+    return sim().getFloatArrays(PmxSim::eGetFloatArray, handle, values, nullptr, nullptr, capacity, count);
 }
-PMX_API int32_t PmxGetAuxFloatArray(int64_t handle, float* values1, float* values2, float* values3,
-    int32_t capacity, int32_t* count)
+PMX_API int32_t PmxGetAuxFloatArray(int64_t handle, float* values1, float* values2, float* values3, int32_t capacity,
+                                    int32_t* count)
 {
-    return sim().getFloatArrays(
-        PmxSim::eGetAuxFloatArray, handle, values1, values2, values3, capacity, count);
+    return sim().getFloatArrays(PmxSim::eGetAuxFloatArray, handle, values1, values2, values3, capacity, count);
 }
 PMX_API int32_t PmxGetLongResult(int64_t handle, int32_t* value1, int32_t* value2, int32_t* value3)
 {
     return sim().getScalars(PmxSim::eGetLongResult, handle, value1, value2, value3);
 }
-PMX_API int32_t PmxGetBitfieldResult(
-    int64_t handle, int32_t* value1, int32_t* value2, int32_t* value3)
+PMX_API int32_t PmxGetBitfieldResult(int64_t handle, int32_t* value1, int32_t* value2, int32_t* value3)
 {
     return sim().getScalars(PmxSim::eGetBitfieldResult, handle, value1, value2, value3);
 }
@@ -88,8 +85,7 @@ PMX_API int32_t PmxGetDeviceListLength(int32_t* count)
 {
     return sim().getDeviceListLength(count);
 }
-PMX_API int32_t PmxGetDeviceInfo(
-    int32_t index, char name[256], char type[256], char serial[256], int32_t* flag)
+PMX_API int32_t PmxGetDeviceInfo(int32_t index, char name[256], char type[256], char serial[256], int32_t* flag)
 {
     return sim().getDeviceInfo(index, name, type, serial, flag);
 }
@@ -104,18 +100,15 @@ PMX_API int32_t PmxSetNotifyCallbackDeviceChanged(PmxDeviceChangedCallback callb
 }
 PMX_API int32_t PmxSetNotifyCallbackErrorOccurred(PmxNotifyCallback callback, void* user)
 {
-    return sim().setNotifyCallback(
-        PmxSim::eSetErrorOccurred, PmxSim::eErrorOccurred, callback, user);
+    return sim().setNotifyCallback(PmxSim::eSetErrorOccurred, PmxSim::eErrorOccurred, callback, user);
 }
 PMX_API int32_t PmxSetNotifyCallbackDataAvailable(PmxNotifyCallback callback, void* user)
 {
-    return sim().setNotifyCallback(
-        PmxSim::eSetDataAvailable, PmxSim::eDataAvailable, callback, user);
+    return sim().setNotifyCallback(PmxSim::eSetDataAvailable, PmxSim::eDataAvailable, callback, user);
 }
 PMX_API int32_t PmxSetNotifyCallbackCommandAccepted(PmxNotifyCallback callback, void* user)
 {
-    return sim().setNotifyCallback(
-        PmxSim::eSetCommandAccepted, PmxSim::eCommandAccepted, callback, user);
+    return sim().setNotifyCallback(PmxSim::eSetCommandAccepted, PmxSim::eCommandAccepted, callback, user);
 }
 PMX_API int32_t PmxSetNotifyCallbackStateChanged(PmxNotifyCallback callback, void* user)
 {
@@ -138,8 +131,7 @@ PMX_API int32_t PmxSimSetDeviceFlag(const char* serial, int32_t flag)
 {
     return sim().setDeviceFlag(serial, flag);
 }
-PMX_API int32_t PmxSimQueueResult(
-    const char* serial, int32_t dataType, const void* values, int32_t count)
+PMX_API int32_t PmxSimQueueResult(const char* serial, int32_t dataType, const void* values, int32_t count)
 {
     return sim().queueResult(serial, dataType, values, count);
 }

@@ -59,18 +59,16 @@ PMX_API int32_t PmxGetTriggerState(int64_t handle, int32_t* state);
 PMX_API int32_t PmxGetData(int64_t handle, int32_t* dataType, int32_t* count, int32_t* pending);
 PMX_API int32_t PmxGetFloatResult(int64_t handle, float* value1, float* value2, float* value3);
 PMX_API int32_t PmxGetFloatArray(int64_t handle, float* values, int32_t capacity, int32_t* count);
-PMX_API int32_t PmxGetAuxFloatArray(int64_t handle, float* values1, float* values2, float* values3,
-    int32_t capacity, int32_t* count);
+PMX_API int32_t PmxGetAuxFloatArray(int64_t handle, float* values1, float* values2, float* values3, int32_t capacity,
+                                    int32_t* count);
 PMX_API int32_t PmxGetLongResult(int64_t handle, int32_t* value1, int32_t* value2, int32_t* value3);
-PMX_API int32_t PmxGetBitfieldResult(
-    int64_t handle, int32_t* value1, int32_t* value2, int32_t* value3);
+PMX_API int32_t PmxGetBitfieldResult(int64_t handle, int32_t* value1, int32_t* value2, int32_t* value3);
 PMX_API int32_t PmxGetBinaryResult(int64_t handle, uint8_t* buffer, int32_t size, int32_t* count);
 PMX_API int32_t PmxGetStringResult(int64_t handle, char* buffer, int32_t size);
 
 /* Attached sensors. */
 PMX_API int32_t PmxGetDeviceListLength(int32_t* count);
-PMX_API int32_t PmxGetDeviceInfo(
-    int32_t index, char name[256], char type[256], char serial[256], int32_t* flag);
+PMX_API int32_t PmxGetDeviceInfo(int32_t index, char name[256], char type[256], char serial[256], int32_t* flag);
 
 PMX_API int32_t PmxGetErrorText(int32_t code, char* buffer, int32_t size);
 

@@ -27,7 +27,7 @@
 
 /* Data types of results: what PmxGetData and the data-available callback report, and what
    PmxSimQueueResult takes. */
-#define PMXSIM_TYPE_BINARY 0 /* bytes */
+#define PMXSIM_TYPE_BINARY 0    /* bytes */
 #define PMXSIM_TYPE_BITFIELD1 1 /* int32_t */
 #define PMXSIM_TYPE_BITFIELD2 2
 #define PMXSIM_TYPE_BITFIELD3 3
@@ -37,7 +37,7 @@
 #define PMXSIM_TYPE_FLOAT_STREAM 7
 #define PMXSIM_TYPE_LONG_TRIPLE 8 /* int32_t */
 #define PMXSIM_TYPE_LONG 9
-#define PMXSIM_TYPE_TEXT 10 /* bytes, without a terminating zero */
+#define PMXSIM_TYPE_TEXT 10            /* bytes, without a terminating zero */
 #define PMXSIM_TYPE_AUX_FLOAT_ARRAY 11 /* float */
 #define PMXSIM_TYPE_LAST PMXSIM_TYPE_AUX_FLOAT_ARRAY
 
@@ -62,8 +62,7 @@ PMX_API int32_t PmxSimSetDeviceFlag(const char* serial, int32_t flag);
 /* Queue one result of data type 0..11 for the open sensor and fire data available. values holds
    count elements: bytes for 0 and 10 (text without its zero), int32_t for 1, 2, 3, 8, 9, float
    for 4, 5, 6, 7, 11. */
-PMX_API int32_t PmxSimQueueResult(
-    const char* serial, int32_t dataType, const void* values, int32_t count);
+PMX_API int32_t PmxSimQueueResult(const char* serial, int32_t dataType, const void* values, int32_t count);
 /* Fire the error callback with that code, for the open sensor, or with handle 0 for a null or
    empty serial. */
 PMX_API int32_t PmxSimReportError(const char* serial, int32_t code);

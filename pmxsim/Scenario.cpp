@@ -12,45 +12,45 @@ namespace PmxSim {
 
 namespace {
 
-    const char* const kDefaultDevices = "PMX-M01:100000,PMX-M10:100001";
-    const size_t kMaxScenarioBytes = 1 << 20;
+const char* const kDefaultDevices = "PMX-M01:100000,PMX-M10:100001";
+const size_t kMaxScenarioBytes = 1 << 20;
 
-    void complain(const std::string& text)
-    {
-        std::fprintf(stderr, "pmxsim: %s\n", text.c_str());
-        std::fflush(stderr);
-    }
+void complain(const std::string& text)
+{
+    std::fprintf(stderr, "pmxsim: %s\n", text.c_str());
+    std::fflush(stderr);
+}
 
-    bool readFile(const std::string& path, std::string* text)
-    {
-        std::ifstream file(path, std::ios::binary);
-        if (!file)
-            return false;
-        std::ostringstream content;
-        content << file.rdbuf();
-        *text = content.str();
-        return !file.bad() && text->size() <= kMaxScenarioBytes;
-    }
+bool readFile(const std::string& path, std::string* text)
+{
+    std::ifstream file(path, std::ios::binary);
+    if (!file)
+        return false;
+    std::ostringstream content;
+    content << file.rdbuf();
+    *text = content.str();
+    return !file.bad() && text->size() <= kMaxScenarioBytes;
+}
 
-    SScenario fileScenario(const std::string& path)
-    {
-        SScenario scenario;
-        std::string text;
-        if (!readFile(path, &text)) {
-            complain(path + ": cannot be read (or is larger than 1 MiB); no sensors attached");
-            return SScenario();
-        }
-        int line = 0;
-        std::string reason;
-        if (!parseScenario(text, &scenario, &line, &reason)) {
-            if (line > 0)
-                complain(path + ":" + std::to_string(line) + ": " + reason + "; no sensors attached");
-            else
-                complain(path + ": " + reason + "; no sensors attached");
-            return SScenario();
-        }
-        return scenario;
+SScenario fileScenario(const std::string& path)
+{
+    SScenario scenario;
+    std::string text;
+    if (!readFile(path, &text)) {
+        complain(path + ": cannot be read (or is larger than 1 MiB); no sensors attached");
+        return SScenario();
     }
+    int line = 0;
+    std::string reason;
+    if (!parseScenario(text, &scenario, &line, &reason)) {
+        if (line > 0)
+            complain(path + ":" + std::to_string(line) + ": " + reason + "; no sensors attached");
+        else
+            complain(path + ": " + reason + "; no sensors attached");
+        return SScenario();
+    }
+    return scenario;
+}
 
 } // namespace
 

@@ -19,10 +19,10 @@ namespace PmxSim {
 // The power at a sensor's input, in dBm, before the settings shape it.
 struct SPowerModel {
     enum EKind {
-        eBuiltIn, // -20 dBm with +-0.05 dB evenly spread noise
+        eBuiltIn,  // -20 dBm with +-0.05 dB evenly spread noise
         eConstant, // dLevelDbm, no noise
         eSequence, // levels, one per measurement, repeated from the start
-        eNoisy // dLevelDbm with Gaussian noise of dNoiseDb (standard deviation)
+        eNoisy     // dLevelDbm with Gaussian noise of dNoiseDb (standard deviation)
     } eKind = eBuiltIn;
     double dLevelDbm = -20.0;
     std::vector<double> levels;

@@ -12,51 +12,65 @@ namespace PmxSim {
 
 namespace {
 
-    const char* const kFunctionNames[] = { "PmxOpenDriver", "PmxCloseDriver", "PmxOpenSensor",
-        "PmxCloseSensor", "PmxSendCommand", "PmxGetData", "PmxGetFloatResult", "PmxGetFloatArray",
-        "PmxGetAuxFloatArray", "PmxGetLongResult", "PmxGetBitfieldResult", "PmxGetBinaryResult",
-        "PmxGetStringResult", "PmxGetTriggerState", "PmxGetDeviceListLength", "PmxGetDeviceInfo",
-        "PmxClearDevice", "PmxEmptyAllBuffers", "PmxGetErrorText",
-        "PmxSetNotifyCallbackDeviceChanged", "PmxSetNotifyCallbackErrorOccurred",
-        "PmxSetNotifyCallbackDataAvailable", "PmxSetNotifyCallbackCommandAccepted",
-        "PmxSetNotifyCallbackStateChanged" };
+const char* const kFunctionNames[] = {"PmxOpenDriver",
+                                      "PmxCloseDriver",
+                                      "PmxOpenSensor",
+                                      "PmxCloseSensor",
+                                      "PmxSendCommand",
+                                      "PmxGetData",
+                                      "PmxGetFloatResult",
+                                      "PmxGetFloatArray",
+                                      "PmxGetAuxFloatArray",
+                                      "PmxGetLongResult",
+                                      "PmxGetBitfieldResult",
+                                      "PmxGetBinaryResult",
+                                      "PmxGetStringResult",
+                                      "PmxGetTriggerState",
+                                      "PmxGetDeviceListLength",
+                                      "PmxGetDeviceInfo",
+                                      "PmxClearDevice",
+                                      "PmxEmptyAllBuffers",
+                                      "PmxGetErrorText",
+                                      "PmxSetNotifyCallbackDeviceChanged",
+                                      "PmxSetNotifyCallbackErrorOccurred",
+                                      "PmxSetNotifyCallbackDataAvailable",
+                                      "PmxSetNotifyCallbackCommandAccepted",
+                                      "PmxSetNotifyCallbackStateChanged"};
 
-    struct SModel {
-        const char* type;
-        uint32_t code;
-    };
-    const SModel kModels[] = { { "PMX", 2 }, { "PMX-M01", 3 }, { "PMX-M02", 4 }, { "PMX-M03", 11 },
-        { "PMX-M04", 12 }, { "PMX-M05", 19 }, { "PMX-M06", 20 }, { "PMX-M07", 21 },
-        { "PMX-M08", 81 }, { "PMX-M09", 44 }, { "PMX-M10", 154 }, { "PMX-M11", 150 },
-        { "PMX-M12", 151 }, { "PMX-M13", 152 }, { "PMX-M14", 26 }, { "PMX-M15", 33 },
-        { "PMX-M16", 98 }, { "PMX-M17", 46 }, { "PMX-M18", 82 }, { "PMX-M19", 166 },
-        { "PMX-M20", 167 }, { "PMX-M21", 35 }, { "PMX-M22", 131 }, { "PMX-M23", 149 },
-        { "PMX-M24", 47 }, { "PMX-M25", 45 }, { "PMX-M26", 22 }, { "PMX-M27", 23 },
-        { "PMX-M28", 24 }, { "PMX-M29", 25 }, { "PMX-M30", 112 }, { "PMX-M31", 168 },
-        { "PMX-M32", 143 }, { "PMX-M33", 144 } };
+struct SModel {
+    const char* type;
+    uint32_t code;
+};
+const SModel kModels[] = {{"PMX", 2},       {"PMX-M01", 3},   {"PMX-M02", 4},   {"PMX-M03", 11},  {"PMX-M04", 12},
+                          {"PMX-M05", 19},  {"PMX-M06", 20},  {"PMX-M07", 21},  {"PMX-M08", 81},  {"PMX-M09", 44},
+                          {"PMX-M10", 154}, {"PMX-M11", 150}, {"PMX-M12", 151}, {"PMX-M13", 152}, {"PMX-M14", 26},
+                          {"PMX-M15", 33},  {"PMX-M16", 98},  {"PMX-M17", 46},  {"PMX-M18", 82},  {"PMX-M19", 166},
+                          {"PMX-M20", 167}, {"PMX-M21", 35},  {"PMX-M22", 131}, {"PMX-M23", 149}, {"PMX-M24", 47},
+                          {"PMX-M25", 45},  {"PMX-M26", 22},  {"PMX-M27", 23},  {"PMX-M28", 24},  {"PMX-M29", 25},
+                          {"PMX-M30", 112}, {"PMX-M31", 168}, {"PMX-M32", 143}, {"PMX-M33", 144}};
 
-    struct SErrorText {
-        int32_t code;
-        const char* text;
-    };
-    const SErrorText kErrorTexts[] = { { PMX_SUCCESS, "No error" },
-        { PMX_ERR_NO_MORE_RESULTS, "No further result available" },
-        { PMX_INFO_COMMAND_IGNORED,
-            "Command ignored: nothing to do in the current measurement state" },
-        { PMX_ERR_UNKNOWN_COMMAND, "Unknown command or invalid parameter" },
-        { PMXSIM_E_DRIVER_NOT_OPEN, "Driver not open" },
-        { PMXSIM_E_INVALID_ARGUMENT, "Invalid argument" },
-        { PMXSIM_E_INVALID_HANDLE, "Unknown sensor handle" },
-        { PMXSIM_E_BAD_DESCRIPTOR, "Malformed sensor descriptor" },
-        { PMXSIM_E_NO_SUCH_SENSOR, "No such sensor attached" },
-        { PMXSIM_E_SENSOR_DETACHED, "Sensor has been detached" },
-        { PMXSIM_E_SENSOR_IN_USE, "Sensor already open" },
-        { PMXSIM_E_INDEX_OUT_OF_RANGE, "Device index out of range" },
-        { PMXSIM_E_TYPE_MISMATCH, "Pending result has another data type" },
-        { PMXSIM_E_BUFFER_TOO_SMALL, "Buffer too small for the pending result" },
-        { PMXSIM_E_SENSOR_NOT_OPEN, "Sensor not open" },
-        { PMXSIM_E_ALREADY_ATTACHED, "Serial number already attached" },
-        { PMXSIM_E_OUT_OF_RESOURCES, "Out of resources" } };
+struct SErrorText {
+    int32_t code;
+    const char* text;
+};
+const SErrorText kErrorTexts[] = {
+    {PMX_SUCCESS, "No error"},
+    {PMX_ERR_NO_MORE_RESULTS, "No further result available"},
+    {PMX_INFO_COMMAND_IGNORED, "Command ignored: nothing to do in the current measurement state"},
+    {PMX_ERR_UNKNOWN_COMMAND, "Unknown command or invalid parameter"},
+    {PMXSIM_E_DRIVER_NOT_OPEN, "Driver not open"},
+    {PMXSIM_E_INVALID_ARGUMENT, "Invalid argument"},
+    {PMXSIM_E_INVALID_HANDLE, "Unknown sensor handle"},
+    {PMXSIM_E_BAD_DESCRIPTOR, "Malformed sensor descriptor"},
+    {PMXSIM_E_NO_SUCH_SENSOR, "No such sensor attached"},
+    {PMXSIM_E_SENSOR_DETACHED, "Sensor has been detached"},
+    {PMXSIM_E_SENSOR_IN_USE, "Sensor already open"},
+    {PMXSIM_E_INDEX_OUT_OF_RANGE, "Device index out of range"},
+    {PMXSIM_E_TYPE_MISMATCH, "Pending result has another data type"},
+    {PMXSIM_E_BUFFER_TOO_SMALL, "Buffer too small for the pending result"},
+    {PMXSIM_E_SENSOR_NOT_OPEN, "Sensor not open"},
+    {PMXSIM_E_ALREADY_ATTACHED, "Serial number already attached"},
+    {PMXSIM_E_OUT_OF_RESOURCES, "Out of resources"}};
 
 } // namespace
 
@@ -107,8 +121,8 @@ bool sameSerial(const std::string& a, const char* b)
 
 bool validText(const char* text)
 {
-    return text != nullptr && *text != '\0' && std::strlen(text) <= kMaxText
-        && std::strchr(text, ':') == nullptr && std::strchr(text, ',') == nullptr;
+    return text != nullptr && *text != '\0' && std::strlen(text) <= kMaxText && std::strchr(text, ':') == nullptr &&
+        std::strchr(text, ',') == nullptr;
 }
 
 void copyText(char* target, const std::string& text)

@@ -20,9 +20,9 @@ const double kMinFrequencyHz = 10e6;
 const double kMaxFrequencyHz = 40e9;
 const int32_t kMaxAverageCount = 1024;
 const double kMaxOffsetDb = 100.0;
-const size_t kMaxPending = 1024; // oldest results are dropped beyond this
-const int32_t kMaxQueuedCount = 1 << 20; // elements of one queued result
-const size_t kMaxText = 255; // device-info buffers hold 256 bytes
+const size_t kMaxPending = 1024;                     // oldest results are dropped beyond this
+const int32_t kMaxQueuedCount = 1 << 20;             // elements of one queued result
+const size_t kMaxText = 255;                         // device-info buffers hold 256 bytes
 const int64_t kFirstHandle = (int64_t(1) << 32) + 1; // handles do not fit 32 bits on purpose
 
 // Trigger states that PmxGetTriggerState reports and the state-changed callback passes.

@@ -65,14 +65,7 @@ enum EFunction {
 };
 static_assert(eFunctionCount == kFunctionCount, "one name per library function");
 
-enum ECallback {
-    eCommandAccepted,
-    eStateChanged,
-    eDataAvailable,
-    eErrorOccurred,
-    eDeviceChanged,
-    eCallbackCount
-};
+enum ECallback { eCommandAccepted, eStateChanged, eDataAvailable, eErrorOccurred, eDeviceChanged, eCallbackCount };
 
 class CSimulator {
 public:
@@ -90,8 +83,8 @@ public:
     int32_t getData(int64_t handle, int32_t* dataType, int32_t* count, int32_t* pending);
     // The getters of one result kind: scalars (three values), arrays, bytes and text.
     int32_t getScalars(EFunction fn, int64_t handle, void* v1, void* v2, void* v3);
-    int32_t getFloatArrays(EFunction fn, int64_t handle, float* a1, float* a2, float* a3,
-        int32_t capacity, int32_t* count);
+    int32_t getFloatArrays(EFunction fn, int64_t handle, float* a1, float* a2, float* a3, int32_t capacity,
+                           int32_t* count);
     int32_t getBinaryResult(int64_t handle, uint8_t* buffer, int32_t size, int32_t* count);
     int32_t getStringResult(int64_t handle, char* buffer, int32_t size);
     int32_t getDeviceListLength(int32_t* count);
@@ -119,8 +112,8 @@ private:
     struct SResult {
         int32_t nType = 0;
         std::vector<uint8_t> bytes; // binary block and text
-        std::vector<int32_t> ints; // bit fields and longs
-        std::vector<float> floats; // float values and arrays
+        std::vector<int32_t> ints;  // bit fields and longs
+        std::vector<float> floats;  // float values and arrays
     };
 
     // What *RST restores: the measurement function and the settings that shape a result.
@@ -143,11 +136,11 @@ private:
         int32_t nTriggerState = 0;
         bool bMeasuring = false;
         bool bContinuous = false;
-        uint64_t nMeasurement = 0; // number of the running measurement; stale steps are dropped
+        uint64_t nMeasurement = 0;    // number of the running measurement; stale steps are dropped
         bool bMeasuringTrace = false; // what the running measurement gives
         SSettings settings;
-        int32_t nEventStatus = 0; // the event status register (*ESR?)
-        int32_t nEventEnable = 0; // *ESE
+        int32_t nEventStatus = 0;   // the event status register (*ESR?)
+        int32_t nEventEnable = 0;   // *ESE
         int32_t nServiceEnable = 0; // *SRE
         int32_t nCommandCount = 0;
         std::string strLastCommand; // as sent, with its timeout argument
@@ -156,7 +149,7 @@ private:
         std::deque<SResult> results;
         // The sensor's model from the scenario, and where its measurements stand.
         std::shared_ptr<const SSensorModel> pModel;
-        std::mt19937 aNoise; // seeded from the model: runs repeat
+        std::mt19937 aNoise;   // seeded from the model: runs repeat
         size_t nNextLevel = 0; // of a power sequence
         int32_t nMeasured = 0; // measurements ended since attached
     };
@@ -191,8 +184,7 @@ private:
     // is 0 when the function may go on; sensor() is then the handle's sensor (eNeedSensor).
     class SCOPED_CAPABILITY CCall {
     public:
-        CCall(CSimulator& sim, EFunction fn, ENeed need, int64_t handle = 0)
-            ACQUIRE(sim.m_aMutex);
+        CCall(CSimulator& sim, EFunction fn, ENeed need, int64_t handle = 0) ACQUIRE(sim.m_aMutex);
         ~CCall() RELEASE();
         CCall(const CCall&) = delete;
         CCall& operator=(const CCall&) = delete;
@@ -237,22 +229,18 @@ private:
     int32_t findOpen(int64_t handle, SensorPtr* sensor) REQUIRES(m_aMutex);
     SensorPtr findAttached(const char* serial) REQUIRES(m_aMutex);
     SensorPtr findOpenBySerial(const char* serial, int32_t* code) REQUIRES(m_aMutex);
-    int32_t checkPending(const SSensor& sensor, int32_t firstType, int32_t lastType)
-        REQUIRES(m_aMutex);
+    int32_t checkPending(const SSensor& sensor, int32_t firstType, int32_t lastType) REQUIRES(m_aMutex);
 
     void post(ECallback kind, int64_t handle, int32_t value) REQUIRES(m_aMutex);
     void schedule(Clock::time_point due, STask task) REQUIRES(m_aMutex);
     void setState(SSensor& sensor, int32_t state) REQUIRES(m_aMutex);
     void runTask(STask& task, Clock::time_point now) REQUIRES(m_aMutex);
-    void runCommand(SSensor& sensor, const std::string& text, Clock::time_point now)
-        REQUIRES(m_aMutex);
-    void applyCommand(SSensor& sensor, const SCommand& command, Clock::time_point now)
-        REQUIRES(m_aMutex);
+    void runCommand(SSensor& sensor, const std::string& text, Clock::time_point now) REQUIRES(m_aMutex);
+    void applyCommand(SSensor& sensor, const SCommand& command, Clock::time_point now) REQUIRES(m_aMutex);
     void applyStatusCommand(SSensor& sensor, const SCommand& command) REQUIRES(m_aMutex);
     void applySetting(SSensor& sensor, const SCommand& command) REQUIRES(m_aMutex);
     void addText(SSensor& sensor, const std::string& text) REQUIRES(m_aMutex);
-    void startMeasurement(SSensor& sensor, bool trace, Clock::time_point now)
-        REQUIRES(m_aMutex);
+    void startMeasurement(SSensor& sensor, bool trace, Clock::time_point now) REQUIRES(m_aMutex);
     float reading(const SSensor& sensor, double levelDbm, double spreadDb) REQUIRES(m_aMutex);
     float powerReading(SSensor& sensor) REQUIRES(m_aMutex);
     void addTrace(SSensor& sensor) REQUIRES(m_aMutex);
@@ -265,16 +253,16 @@ private:
     float noise() REQUIRES(m_aMutex);
 
     LbCore::CMutex m_aMutex;
-    std::condition_variable_any m_aWorkChanged; // wakes the worker
+    std::condition_variable_any m_aWorkChanged;      // wakes the worker
     bool m_bWakeWorker GUARDED_BY(m_aMutex) = false; // work changed under the lock: wake it
-    std::condition_variable_any m_aDeliveryChanged; // wakes registrations waiting for a delivery
+    std::condition_variable_any m_aDeliveryChanged;  // wakes registrations waiting for a delivery
 
     bool m_bDriverOpen GUARDED_BY(m_aMutex) = false;
     SWorker* m_pWorker GUARDED_BY(m_aMutex) = nullptr;
     // A worker runs while the generation it was started for is current.
     uint64_t m_nGeneration GUARDED_BY(m_aMutex) = 0;
 
-    std::vector<SensorPtr> m_aSensors GUARDED_BY(m_aMutex); // attached, in attach order
+    std::vector<SensorPtr> m_aSensors GUARDED_BY(m_aMutex);    // attached, in attach order
     std::map<int64_t, SensorPtr> m_aOpen GUARDED_BY(m_aMutex); // open, also detached sensors
     int64_t m_nNextHandle GUARDED_BY(m_aMutex);
 
@@ -284,14 +272,14 @@ private:
 
     SCallback m_aCallbacks[eCallbackCount] GUARDED_BY(m_aMutex);
     int m_aDelivering[eCallbackCount] GUARDED_BY(m_aMutex) = {}; // running now, per kind
-    uint64_t m_nDeliveries GUARDED_BY(m_aMutex) = 0; // callbacks that have returned
+    uint64_t m_nDeliveries GUARDED_BY(m_aMutex) = 0;             // callbacks that have returned
 
     int32_t m_nAckMs GUARDED_BY(m_aMutex) = 0;
     int32_t m_nMeasureMs GUARDED_BY(m_aMutex) = 0;
     bool m_bAutoAck GUARDED_BY(m_aMutex) = true;
     int32_t m_aInjected[eFunctionCount] GUARDED_BY(m_aMutex);
     uint64_t m_aCalls[eFunctionCount] GUARDED_BY(m_aMutex); // since the scenario was loaded
-    std::vector<SFault> m_aFaults GUARDED_BY(m_aMutex); // scripted by the scenario
+    std::vector<SFault> m_aFaults GUARDED_BY(m_aMutex);     // scripted by the scenario
     std::minstd_rand m_aRandom GUARDED_BY(m_aMutex);
 };
 

@@ -100,7 +100,7 @@ int32_t CSimulator::detach(const char* serial)
     if (serial == nullptr)
         return PMXSIM_E_INVALID_ARGUMENT;
     auto it = std::find_if(m_aSensors.begin(), m_aSensors.end(),
-        [&](const SensorPtr& s) { return sameSerial(s->strSerial, serial); });
+                           [&](const SensorPtr& s) { return sameSerial(s->strSerial, serial); });
     if (it == m_aSensors.end())
         return PMXSIM_E_NO_SUCH_SENSOR;
     detachLocked(*it);
@@ -131,12 +131,11 @@ int32_t CSimulator::setDeviceFlag(const char* serial, int32_t flag)
     return PMX_SUCCESS;
 }
 
-int32_t CSimulator::queueResult(
-    const char* serial, int32_t dataType, const void* values, int32_t count)
+int32_t CSimulator::queueResult(const char* serial, int32_t dataType, const void* values, int32_t count)
 {
     CLock lock(*this);
-    if (dataType < 0 || dataType > PMXSIM_TYPE_LAST || count < 0 || count > kMaxQueuedCount
-        || (count > 0 && values == nullptr))
+    if (dataType < 0 || dataType > PMXSIM_TYPE_LAST || count < 0 || count > kMaxQueuedCount ||
+        (count > 0 && values == nullptr))
         return PMXSIM_E_INVALID_ARGUMENT;
     int32_t code;
     SensorPtr sensor = findOpenBySerial(serial, &code);

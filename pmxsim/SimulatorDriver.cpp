@@ -12,11 +12,11 @@
 namespace PmxSim {
 
 namespace {
-    // Set on the callback thread while it runs a callback: a registration made from inside a
-    // callback must not wait for that callback to return.
-    thread_local bool t_bInCallback = false;
-    // The instance once made: unloading a library that was never called has nothing to stop.
-    std::atomic<CSimulator*> g_pInstance(nullptr);
+// Set on the callback thread while it runs a callback: a registration made from inside a
+// callback must not wait for that callback to return.
+thread_local bool t_bInCallback = false;
+// The instance once made: unloading a library that was never called has nothing to stop.
+std::atomic<CSimulator*> g_pInstance(nullptr);
 } // namespace
 
 CSimulator& CSimulator::instance()
@@ -51,8 +51,7 @@ void CSimulator::shutdownAtUnload()
     sim.finishStop(worker);
 }
 
-CSimulator::CCall::CCall(CSimulator& sim, EFunction fn, ENeed need, int64_t handle)
-    : m_rSim(sim)
+CSimulator::CCall::CCall(CSimulator& sim, EFunction fn, ENeed need, int64_t handle) : m_rSim(sim)
 {
     sim.m_aMutex.lock();
     if (sim.takeInjected(fn, &m_nCode))
@@ -68,8 +67,7 @@ CSimulator::CCall::~CCall()
     m_rSim.unlockAndWake();
 }
 
-CSimulator::CLock::CLock(CSimulator& sim)
-    : m_rSim(sim)
+CSimulator::CLock::CLock(CSimulator& sim) : m_rSim(sim)
 {
     sim.m_aMutex.lock();
 }
@@ -131,8 +129,7 @@ int32_t CSimulator::openDriver()
     if (m_bDriverOpen)
         return PMX_SUCCESS;
     ++m_nGeneration;
-    std::pair<CSimulator*, uint64_t>* start
-        = new (std::nothrow) std::pair<CSimulator*, uint64_t>(this, m_nGeneration);
+    std::pair<CSimulator*, uint64_t>* start = new (std::nothrow) std::pair<CSimulator*, uint64_t>(this, m_nGeneration);
     if (start == nullptr)
         return PMXSIM_E_OUT_OF_RESOURCES;
     // Started under the lock: the worker's first step takes it, so it sees m_pWorker set.
@@ -197,8 +194,7 @@ void CSimulator::waitForAllDeliveriesLocked()
 {
     if (t_bInCallback)
         return;
-    while (std::any_of(std::begin(m_aDelivering), std::end(m_aDelivering),
-        [](int running) { return running != 0; }))
+    while (std::any_of(std::begin(m_aDelivering), std::end(m_aDelivering), [](int running) { return running != 0; }))
         m_aDeliveryChanged.wait(m_aMutex);
 }
 
@@ -253,7 +249,7 @@ void CSimulator::post(ECallback kind, int64_t handle, int32_t value)
     // Without an open driver there is no callback thread, and nobody to tell.
     if (!m_bDriverOpen)
         return;
-    m_aOutbox.push_back(SEvent{ kind, handle, value });
+    m_aOutbox.push_back(SEvent{kind, handle, value});
     m_bWakeWorker = true;
 }
 
@@ -265,8 +261,7 @@ void CSimulator::schedule(Clock::time_point due, STask task)
 
 // ---- callback registrations ----
 
-int32_t CSimulator::setNotifyCallback(
-    EFunction fn, ECallback kind, PmxNotifyCallback callback, void* user)
+int32_t CSimulator::setNotifyCallback(EFunction fn, ECallback kind, PmxNotifyCallback callback, void* user)
 {
     CCall call(*this, fn, eNeedNothing);
     if (call.code() != PMX_SUCCESS)

@@ -36,8 +36,7 @@ int32_t CSimulator::openSensor(const char* descriptor, int64_t* handle)
     if (fields.size() != 4 || lower(fields[0]) != "usb" || lower(fields[1]) != "0x0c6f")
         return PMXSIM_E_BAD_DESCRIPTOR;
     const std::string& digits = fields[2];
-    if (digits.size() < 4 || digits.size() > 10
-        || digits.find_first_not_of("0123456789") != std::string::npos)
+    if (digits.size() < 4 || digits.size() > 10 || digits.find_first_not_of("0123456789") != std::string::npos)
         return PMXSIM_E_BAD_DESCRIPTOR;
     unsigned long long model = std::strtoull(digits.c_str(), nullptr, 10);
     const std::string& serial = fields[3];
@@ -100,10 +99,9 @@ int32_t CSimulator::sendCommand(int64_t handle, const char* text, int32_t timeou
     sensor.strLastCommand = text;
     sensor.nLastTimeout = timeout;
     // Commands of one sensor are answered in the order sent, even when the delay was shortened.
-    Clock::time_point due
-        = std::max(Clock::now() + std::chrono::milliseconds(m_nAckMs), sensor.tLastCommand);
+    Clock::time_point due = std::max(Clock::now() + std::chrono::milliseconds(m_nAckMs), sensor.tLastCommand);
     sensor.tLastCommand = due;
-    schedule(due, STask{ STask::eCommand, m_aOpen.at(handle), handle, text, 0 });
+    schedule(due, STask{STask::eCommand, m_aOpen.at(handle), handle, text, 0});
     return PMX_SUCCESS;
 }
 
@@ -179,17 +177,15 @@ int32_t CSimulator::getScalars(EFunction fn, int64_t handle, void* v1, void* v2,
     if (call.code() != PMX_SUCCESS)
         return call.code();
     bool floats = fn == eGetFloatResult;
-    int32_t first = floats ? PMXSIM_TYPE_FLOAT_TRIPLE
+    int32_t first = floats     ? PMXSIM_TYPE_FLOAT_TRIPLE
         : fn == eGetLongResult ? PMXSIM_TYPE_LONG_TRIPLE
                                : PMXSIM_TYPE_BITFIELD1;
-    int32_t last = floats ? PMXSIM_TYPE_FLOAT_STREAM
-        : fn == eGetLongResult ? PMXSIM_TYPE_LONG
-                               : PMXSIM_TYPE_BITFIELD3;
+    int32_t last = floats ? PMXSIM_TYPE_FLOAT_STREAM : fn == eGetLongResult ? PMXSIM_TYPE_LONG : PMXSIM_TYPE_BITFIELD3;
     SSensor& sensor = call.sensor();
     if (int32_t code = checkPending(sensor, first, last))
         return code;
     const SResult& result = sensor.results.front();
-    void* outputs[3] = { v1, v2, v3 };
+    void* outputs[3] = {v1, v2, v3};
     for (size_t i = 0; i < 3; ++i) {
         if (outputs[i] == nullptr)
             continue;
@@ -205,8 +201,8 @@ int32_t CSimulator::getScalars(EFunction fn, int64_t handle, void* v1, void* v2,
 // Float arrays (4) fill the first array; auxiliary arrays (11) fill the first with the queued
 // values and the other two, where given, with as many zeros. A result that does not fit stays
 // pending.
-int32_t CSimulator::getFloatArrays(
-    EFunction fn, int64_t handle, float* a1, float* a2, float* a3, int32_t capacity, int32_t* count)
+int32_t CSimulator::getFloatArrays(EFunction fn, int64_t handle, float* a1, float* a2, float* a3, int32_t capacity,
+                                   int32_t* count)
 {
     CCall call(*this, fn, eNeedSensor, handle);
     if (call.code() != PMX_SUCCESS)
@@ -283,8 +279,7 @@ int32_t CSimulator::getDeviceListLength(int32_t* count)
 }
 
 // name: the sensor's descriptor when its type is a known model, else "<type> <serial>".
-int32_t CSimulator::getDeviceInfo(
-    int32_t index, char* name, char* type, char* serial, int32_t* flag)
+int32_t CSimulator::getDeviceInfo(int32_t index, char* name, char* type, char* serial, int32_t* flag)
 {
     CCall call(*this, eGetDeviceInfo, eNeedDriver);
     if (call.code() != PMX_SUCCESS)
@@ -321,7 +316,7 @@ int32_t CSimulator::getErrorText(int32_t code, char* buffer, int32_t size)
     const char* text = errorText(code);
     if (text == nullptr) {
         std::snprintf(unknown, sizeof unknown, "Unknown error code 0x%08X",
-            static_cast<unsigned>(static_cast<uint32_t>(code)));
+                      static_cast<unsigned>(static_cast<uint32_t>(code)));
         text = unknown;
     }
     size_t n = std::min(std::strlen(text), static_cast<size_t>(size) - 1);

@@ -13,20 +13,20 @@
 namespace PmxSim {
 
 namespace {
-    const float kPowerDbm = -20.0f; // level of a measurement and of a pulse top
-    const float kFloorDbm = -60.0f; // level outside the pulse of a trace
-    const double kResponseDbPerGHz = -0.2; // level change per GHz away from 1 GHz
-    const char* const kScpiVersion = "1999.0";
-    // Bits of the event status register.
-    const int32_t kEventOperationComplete = 1;
-    const int32_t kEventCommandError = 32;
+const float kPowerDbm = -20.0f;        // level of a measurement and of a pulse top
+const float kFloorDbm = -60.0f;        // level outside the pulse of a trace
+const double kResponseDbPerGHz = -0.2; // level change per GHz away from 1 GHz
+const char* const kScpiVersion = "1999.0";
+// Bits of the event status register.
+const int32_t kEventOperationComplete = 1;
+const int32_t kEventCommandError = 32;
 
-    std::string number(double value)
-    {
-        char text[32];
-        std::snprintf(text, sizeof text, "%.9g", value);
-        return text;
-    }
+std::string number(double value)
+{
+    char text[32];
+    std::snprintf(text, sizeof text, "%.9g", value);
+    return text;
+}
 } // namespace
 
 float CSimulator::noise()
@@ -60,8 +60,7 @@ void CSimulator::startMeasurement(SSensor& sensor, bool trace, Clock::time_point
     setState(sensor, kStateMeasuring);
     // A continuous measurement takes at least 1 ms so that it cannot saturate the callback thread.
     int32_t duration = sensor.bContinuous ? std::max(m_nMeasureMs, 1) : m_nMeasureMs;
-    STask task{ STask::eMeasurementDone, m_aOpen.at(sensor.nHandle), sensor.nHandle,
-        std::string(), sensor.nMeasurement };
+    STask task{STask::eMeasurementDone, m_aOpen.at(sensor.nHandle), sensor.nHandle, std::string(), sensor.nMeasurement};
     schedule(now + std::chrono::milliseconds(duration), std::move(task));
 }
 
@@ -120,8 +119,7 @@ void CSimulator::addTrace(SSensor& sensor)
         else if (rise >= 0.0)
             share = trace.dRiseUs > 0.0 ? std::min(1.0, rise / trace.dRiseUs) : 1.0;
         double level = trace.dLowDbm + share * (trace.dHighDbm - trace.dLowDbm);
-        result.floats.push_back(
-            reading(sensor, level, trace.dNoiseDb > 0.0 ? gauss(sensor.aNoise) : 0.0));
+        result.floats.push_back(reading(sensor, level, trace.dNoiseDb > 0.0 ? gauss(sensor.aNoise) : 0.0));
     }
     addResult(sensor, std::move(result));
 }
@@ -170,8 +168,7 @@ void CSimulator::runCommand(SSensor& sensor, const std::string& text, Clock::tim
     if (answerFromModel(sensor, text))
         return;
     SCommand command = parseCommand(text);
-    bool starts = command.eAction == eMeasure || command.eAction == eRead
-        || command.eAction == eMeasurePower;
+    bool starts = command.eAction == eMeasure || command.eAction == eRead || command.eAction == eMeasurePower;
     bool stopsContinuous = command.eAction == eContinuous && !command.bQuery && command.nValue == 0;
     // Asking for a measurement while one runs, or for the end of a continuous measurement that
     // is not running, is harmless and answered with the benign notice.
@@ -250,8 +247,8 @@ void CSimulator::applyCommand(SSensor& sensor, const SCommand& command, Clock::t
 void CSimulator::applyStatusCommand(SSensor& sensor, const SCommand& command)
 {
     int32_t* enable = command.eAction == eEventEnable ? &sensor.nEventEnable
-        : command.eAction == eServiceEnable          ? &sensor.nServiceEnable
-                                                     : nullptr;
+        : command.eAction == eServiceEnable           ? &sensor.nServiceEnable
+                                                      : nullptr;
     switch (command.eAction) {
     case eClearStatus:
         sensor.nEventStatus = 0;

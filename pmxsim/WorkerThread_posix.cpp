@@ -13,20 +13,20 @@ struct SWorker {
 };
 
 namespace {
-    void* trampoline(void* p)
-    {
-        // Copied first: a worker that detaches itself frees the record while it still runs.
-        SWorker* worker = static_cast<SWorker*>(p);
-        void (*fn)(void*) = worker->fn;
-        void* arg = worker->arg;
-        fn(arg);
-        return nullptr;
-    }
+void* trampoline(void* p)
+{
+    // Copied first: a worker that detaches itself frees the record while it still runs.
+    SWorker* worker = static_cast<SWorker*>(p);
+    void (*fn)(void*) = worker->fn;
+    void* arg = worker->arg;
+    fn(arg);
+    return nullptr;
+}
 } // namespace
 
 SWorker* startWorker(void (*fn)(void*), void* arg)
 {
-    SWorker* worker = new (std::nothrow) SWorker{ pthread_t(), fn, arg };
+    SWorker* worker = new (std::nothrow) SWorker{pthread_t(), fn, arg};
     if (worker == nullptr)
         return nullptr;
     if (pthread_create(&worker->thread, nullptr, trampoline, worker) != 0) {

@@ -15,27 +15,27 @@ struct SWorker {
 };
 
 namespace {
-    DWORD WINAPI trampoline(LPVOID p)
-    {
-        SWorker* worker = static_cast<SWorker*>(p);
-        void (*fn)(void*) = worker->fn;
-        void* arg = worker->arg;
-        HMODULE module = worker->module;
-        fn(arg);
-        // Releases the module reference and ends the thread without returning into the module.
-        FreeLibraryAndExitThread(module, 0);
-        return 0;
-    }
+DWORD WINAPI trampoline(LPVOID p)
+{
+    SWorker* worker = static_cast<SWorker*>(p);
+    void (*fn)(void*) = worker->fn;
+    void* arg = worker->arg;
+    HMODULE module = worker->module;
+    fn(arg);
+    // Releases the module reference and ends the thread without returning into the module.
+    FreeLibraryAndExitThread(module, 0);
+    return 0;
+}
 } // namespace
 
 SWorker* startWorker(void (*fn)(void*), void* arg)
 {
-    SWorker* worker = new (std::nothrow) SWorker{ nullptr, 0, nullptr, fn, arg };
+    SWorker* worker = new (std::nothrow) SWorker{nullptr, 0, nullptr, fn, arg};
     if (worker == nullptr)
         return nullptr;
     // The thread keeps this module loaded until it has left it (see the header).
-    if (!GetModuleHandleExW(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS,
-            reinterpret_cast<LPCWSTR>(&trampoline), &worker->module)) {
+    if (!GetModuleHandleExW(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS, reinterpret_cast<LPCWSTR>(&trampoline),
+                            &worker->module)) {
         delete worker;
         return nullptr;
     }

@@ -22,7 +22,7 @@ struct CPmxEvent {
 
 class CIPmxEventListener : public LbCore::CMemoryPool::CMemoryPoolManaged {
 public:
-    ~CIPmxEventListener() override {}
+    ~CIPmxEventListener() override { }
     virtual void notifyCommandAcceptedEvent(const CPmxEvent& event) = 0;
     virtual void notifyDataAvailableEvent(const CPmxEvent& event) = 0;
     virtual void notifyErrorOccuredEvent(const CPmxEvent& event) = 0;
@@ -43,7 +43,7 @@ const std::int32_t PMX_UNKNOWN_COMMAND = static_cast<std::int32_t>(0xD0000089u);
 
 class CIPmxCommands {
 public:
-    virtual ~CIPmxCommands() {}
+    virtual ~CIPmxCommands() { }
     virtual void setEventListener(CIPmxEventListener* listener) = 0;
     virtual std::int32_t openDriver() = 0;
     virtual std::int32_t closeDriver() = 0;
@@ -56,15 +56,21 @@ public:
     virtual std::int32_t getErrorText(std::int32_t code, char* buffer, std::int32_t size) = 0;
     virtual std::int32_t emptyAllBuffers(CPmxSession& session) = 0;
     virtual std::int32_t getStringResult(CPmxSession& session, char* buffer, std::int32_t size) = 0;
-    virtual std::int32_t getBinaryResult(CPmxSession& session, unsigned char* buffer, std::int32_t size, std::int32_t* count) = 0;
-    virtual std::int32_t getBitfieldResult(CPmxSession& session, std::int32_t* out1, std::int32_t* out2, std::int32_t* out3) = 0;
-    virtual std::int32_t getLongResult(CPmxSession& session, std::int32_t* out1, std::int32_t* out2, std::int32_t* out3) = 0;
+    virtual std::int32_t getBinaryResult(CPmxSession& session, unsigned char* buffer, std::int32_t size,
+                                         std::int32_t* count) = 0;
+    virtual std::int32_t getBitfieldResult(CPmxSession& session, std::int32_t* out1, std::int32_t* out2,
+                                           std::int32_t* out3) = 0;
+    virtual std::int32_t getLongResult(CPmxSession& session, std::int32_t* out1, std::int32_t* out2,
+                                       std::int32_t* out3) = 0;
     virtual std::int32_t getFloatResult(CPmxSession& session, float* out1, float* out2, float* out3) = 0;
-    virtual std::int32_t getFloatArray(CPmxSession& session, float* array, std::int32_t capacity, std::int32_t* count) = 0;
-    virtual std::int32_t getAuxFloatArray(CPmxSession& session, float* array1, float* array2, float* array3, std::int32_t capacity, std::int32_t* count) = 0;
+    virtual std::int32_t getFloatArray(CPmxSession& session, float* array, std::int32_t capacity,
+                                       std::int32_t* count) = 0;
+    virtual std::int32_t getAuxFloatArray(CPmxSession& session, float* array1, float* array2, float* array3,
+                                          std::int32_t capacity, std::int32_t* count) = 0;
     virtual std::int32_t getTriggerState(CPmxSession& session, std::int32_t* state) = 0;
     virtual std::int32_t getDeviceListLength(std::int32_t* count) = 0;
-    virtual std::int32_t getDeviceInfo(std::int32_t index, std::string& name, std::string& type, std::string& serial, std::int32_t* flag) = 0;
+    virtual std::int32_t getDeviceInfo(std::int32_t index, std::string& name, std::string& type, std::string& serial,
+                                       std::int32_t* flag) = 0;
 };
 
 } // namespace LbPmxVisa

@@ -6,13 +6,9 @@
 
 namespace LbPmxVisa {
 
-CPmxControl::CPmxControl()
-    : m_bDriverOpen(false)
-    , m_pcListener(nullptr)
-{
-}
+CPmxControl::CPmxControl() : m_bDriverOpen(false), m_pcListener(nullptr) { }
 
-CPmxControl::~CPmxControl() {}
+CPmxControl::~CPmxControl() { }
 
 void CPmxControl::setEventListener(CIPmxEventListener* listener)
 {
@@ -139,17 +135,20 @@ std::int32_t CPmxControl::getStringResult(CPmxSession& session, char* buffer, st
     return PmxGetStringResult(session.getHandle(), buffer, size);
 }
 
-std::int32_t CPmxControl::getBinaryResult(CPmxSession& session, unsigned char* buffer, std::int32_t size, std::int32_t* count)
+std::int32_t CPmxControl::getBinaryResult(CPmxSession& session, unsigned char* buffer, std::int32_t size,
+                                          std::int32_t* count)
 {
     return PmxGetBinaryResult(session.getHandle(), buffer, size, count);
 }
 
-std::int32_t CPmxControl::getBitfieldResult(CPmxSession& session, std::int32_t* out1, std::int32_t* out2, std::int32_t* out3)
+std::int32_t CPmxControl::getBitfieldResult(CPmxSession& session, std::int32_t* out1, std::int32_t* out2,
+                                            std::int32_t* out3)
 {
     return PmxGetBitfieldResult(session.getHandle(), out1, out2, out3);
 }
 
-std::int32_t CPmxControl::getLongResult(CPmxSession& session, std::int32_t* out1, std::int32_t* out2, std::int32_t* out3)
+std::int32_t CPmxControl::getLongResult(CPmxSession& session, std::int32_t* out1, std::int32_t* out2,
+                                        std::int32_t* out3)
 {
     return PmxGetLongResult(session.getHandle(), out1, out2, out3);
 }
@@ -164,7 +163,8 @@ std::int32_t CPmxControl::getFloatArray(CPmxSession& session, float* array, std:
     return PmxGetFloatArray(session.getHandle(), array, capacity, count);
 }
 
-std::int32_t CPmxControl::getAuxFloatArray(CPmxSession& session, float* array1, float* array2, float* array3, std::int32_t capacity, std::int32_t* count)
+std::int32_t CPmxControl::getAuxFloatArray(CPmxSession& session, float* array1, float* array2, float* array3,
+                                           std::int32_t capacity, std::int32_t* count)
 {
     return PmxGetAuxFloatArray(session.getHandle(), array1, array2, array3, capacity, count);
 }
@@ -181,7 +181,8 @@ std::int32_t CPmxControl::getDeviceListLength(std::int32_t* count)
 
 // The buffers start empty: a failing library call may leave them unwritten, and the texts are
 // copied whatever the result.
-std::int32_t CPmxControl::getDeviceInfo(std::int32_t index, std::string& name, std::string& type, std::string& serial, std::int32_t* flag)
+std::int32_t CPmxControl::getDeviceInfo(std::int32_t index, std::string& name, std::string& type, std::string& serial,
+                                        std::int32_t* flag)
 {
     char nameText[256] = "";
     char typeText[256] = "";
@@ -202,7 +203,7 @@ void CPmxControl::forward(PmxNotification notification, std::int64_t handle, std
 {
     CIPmxEventListener* listener = m_pcListener;
     if (listener != nullptr) {
-        CPmxEvent event = { handle, value };
+        CPmxEvent event = {handle, value};
         try {
             (listener->*notification)(event);
         } catch (...) {

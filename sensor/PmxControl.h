@@ -40,15 +40,20 @@ public:
     std::int32_t getErrorText(std::int32_t code, char* buffer, std::int32_t size) override;
     std::int32_t emptyAllBuffers(CPmxSession& session) override;
     std::int32_t getStringResult(CPmxSession& session, char* buffer, std::int32_t size) override;
-    std::int32_t getBinaryResult(CPmxSession& session, unsigned char* buffer, std::int32_t size, std::int32_t* count) override;
-    std::int32_t getBitfieldResult(CPmxSession& session, std::int32_t* out1, std::int32_t* out2, std::int32_t* out3) override;
-    std::int32_t getLongResult(CPmxSession& session, std::int32_t* out1, std::int32_t* out2, std::int32_t* out3) override;
+    std::int32_t getBinaryResult(CPmxSession& session, unsigned char* buffer, std::int32_t size,
+                                 std::int32_t* count) override;
+    std::int32_t getBitfieldResult(CPmxSession& session, std::int32_t* out1, std::int32_t* out2,
+                                   std::int32_t* out3) override;
+    std::int32_t getLongResult(CPmxSession& session, std::int32_t* out1, std::int32_t* out2,
+                               std::int32_t* out3) override;
     std::int32_t getFloatResult(CPmxSession& session, float* out1, float* out2, float* out3) override;
     std::int32_t getFloatArray(CPmxSession& session, float* array, std::int32_t capacity, std::int32_t* count) override;
-    std::int32_t getAuxFloatArray(CPmxSession& session, float* array1, float* array2, float* array3, std::int32_t capacity, std::int32_t* count) override;
+    std::int32_t getAuxFloatArray(CPmxSession& session, float* array1, float* array2, float* array3,
+                                  std::int32_t capacity, std::int32_t* count) override;
     std::int32_t getTriggerState(CPmxSession& session, std::int32_t* state) override;
     std::int32_t getDeviceListLength(std::int32_t* count) override;
-    std::int32_t getDeviceInfo(std::int32_t index, std::string& name, std::string& type, std::string& serial, std::int32_t* flag) override;
+    std::int32_t getDeviceInfo(std::int32_t index, std::string& name, std::string& type, std::string& serial,
+                               std::int32_t* flag) override;
 
     // Removes the five callbacks; when it returns no callback runs in the adapter any more.
     void removeCallbacks();

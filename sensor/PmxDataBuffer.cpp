@@ -12,11 +12,10 @@ namespace LbPmxVisa {
 
 // The holders of the three raw sources; each appends a given number of bytes of its source to
 // the buffer it belongs to, for the one write it is made for.
-template <class T>
-struct CPmxDataBuffer::CTypeMapping<T, 1> {
+template <class T> struct CPmxDataBuffer::CTypeMapping<T, 1> {
     class CBufferHolder : public LbCore::CParent<CPmxDataBuffer> {
     public:
-        CBufferHolder(CPmxDataBuffer* buffer, T source) : LbCore::CParent<CPmxDataBuffer>(buffer), m_pSource(source) {}
+        CBufferHolder(CPmxDataBuffer* buffer, T source) : LbCore::CParent<CPmxDataBuffer>(buffer), m_pSource(source) { }
         void write(unsigned length) const { getParent()->writeRaw(m_pSource, length); }
 
     private:
@@ -25,16 +24,14 @@ struct CPmxDataBuffer::CTypeMapping<T, 1> {
 };
 
 CPmxDataBuffer::CPmxDataBuffer(CPmxSession& session, char* buffer, std::size_t capacity, std::uint32_t* count)
-    : LbCore::CParent<CPmxSession>(&session), m_pcPosition(buffer), m_nCapacity(capacity), m_pnCount(count), m_pcSpill(nullptr)
+    : LbCore::CParent<CPmxSession>(&session), m_pcPosition(buffer), m_nCapacity(capacity), m_pnCount(count),
+      m_pcSpill(nullptr)
 {
 }
 
 CPmxDataBuffer::CPmxDataBuffer(const CPmxDataBuffer& other)
-    : LbCore::CParent<CPmxSession>(other.m_pcParent),
-      m_pcPosition(other.m_pcPosition),
-      m_nCapacity(other.m_nCapacity),
-      m_pnCount(other.m_pnCount),
-      m_pcSpill(other.m_pcSpill)
+    : LbCore::CParent<CPmxSession>(other.m_pcParent), m_pcPosition(other.m_pcPosition), m_nCapacity(other.m_nCapacity),
+      m_pnCount(other.m_pnCount), m_pcSpill(other.m_pcSpill)
 {
 }
 
@@ -89,7 +86,7 @@ void CPmxDataBuffer::write(const std::string& text)
 
 void CPmxDataBuffer::write(unsigned char (*source)[1024], unsigned length)
 {
-    CTypeMapping<unsigned char (*)[1024], 1>::CBufferHolder(this, source).write(length);
+    CTypeMapping<unsigned char(*)[1024], 1>::CBufferHolder(this, source).write(length);
 }
 
 void CPmxDataBuffer::write(float* source, unsigned length)
@@ -134,7 +131,8 @@ bool CPmxDataBuffer::copyTo(char* destination, const void* source, std::size_t l
     }
     std::uintptr_t start = reinterpret_cast<std::uintptr_t>(m_pcPosition) - *m_pnCount;
     std::uintptr_t target = reinterpret_cast<std::uintptr_t>(destination);
-    if (target < start + 1 || target > start + m_nCapacity || length > start + m_nCapacity - target || length > getRoom()) {
+    if (target < start + 1 || target > start + m_nCapacity || length > start + m_nCapacity - target ||
+        length > getRoom()) {
         return false;
     }
     std::memmove(destination, source, length);

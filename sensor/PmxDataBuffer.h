@@ -27,8 +27,7 @@ public:
     };
 
     // Raw-write holders for the three source types a result is copied from.
-    template <class T, int N>
-    struct CTypeMapping;
+    template <class T, int N> struct CTypeMapping;
 
     typedef LbCore::CISerializer<CPmxDataBuffer&, void> CSerializer;
 
@@ -36,7 +35,7 @@ public:
     // a text write (which needs one byte more for its zero byte when it is written again).
     class CSpill {
     public:
-        CSpill() : m_bActive(false), m_bText(false) {}
+        CSpill() : m_bActive(false), m_bText(false) { }
         bool isActive() const { return m_bActive; }
         void clear()
         {
@@ -55,7 +54,7 @@ public:
     CPmxDataBuffer(CPmxSession& session, char* buffer, std::size_t capacity, std::uint32_t* count);
     CPmxDataBuffer(const CPmxDataBuffer& other);
     CPmxDataBuffer& operator=(const CPmxDataBuffer& other);
-    ~CPmxDataBuffer() override {}
+    ~CPmxDataBuffer() override { }
 
     // Raw writes take the length in bytes.
     void write(const std::string& text);

@@ -13,7 +13,8 @@ void CStringDataSerializer::serialize(CPmxDataBuffer& buffer) const
     CPmxSession* session = buffer.getParent();
     // One byte more than the library may fill, so the text always ends in a zero byte.
     char text[kBlock + 1] = {};
-    session->getParent()->callChecked(&CIPmxCommands::getStringResult, *session, text, static_cast<std::int32_t>(kBlock));
+    session->getParent()->callChecked(&CIPmxCommands::getStringResult, *session, text,
+                                      static_cast<std::int32_t>(kBlock));
     buffer.write(std::string(text));
 }
 
@@ -53,7 +54,8 @@ const CPmxDataSerializer& CPmxDataSerializerFactory::get(EDataType type) const
     case eBitfield1:
     case eBitfield2:
     case eBitfield3: {
-        static const CPmxGenericDataSerializer<CPmxOneDataFormatter<3>, std::int32_t> serializer(&CIPmxCommands::getBitfieldResult);
+        static const CPmxGenericDataSerializer<CPmxOneDataFormatter<3>, std::int32_t> serializer(
+            &CIPmxCommands::getBitfieldResult);
         return serializer;
     }
     case eFloatArray: {
@@ -73,23 +75,28 @@ const CPmxDataSerializer& CPmxDataSerializerFactory::get(EDataType type) const
         return serializer;
     }
     case eFloatTriple: {
-        static const CPmxGenericDataSerializer<CPmxThreeDataFormatter<5>, float> serializer(&CIPmxCommands::getFloatResult);
+        static const CPmxGenericDataSerializer<CPmxThreeDataFormatter<5>, float> serializer(
+            &CIPmxCommands::getFloatResult);
         return serializer;
     }
     case eFloatSingle: {
-        static const CPmxGenericDataSerializer<CPmxOneDataFormatter<6>, float> serializer(&CIPmxCommands::getFloatResult);
+        static const CPmxGenericDataSerializer<CPmxOneDataFormatter<6>, float> serializer(
+            &CIPmxCommands::getFloatResult);
         return serializer;
     }
     case eFloatStream: {
-        static const CPmxGenericDataSerializer<CPmxStreamDataFormatter<7>, float> serializer(&CIPmxCommands::getFloatResult);
+        static const CPmxGenericDataSerializer<CPmxStreamDataFormatter<7>, float> serializer(
+            &CIPmxCommands::getFloatResult);
         return serializer;
     }
     case eLongTriple: {
-        static const CPmxGenericDataSerializer<CPmxThreeDataFormatter<8>, std::int32_t> serializer(&CIPmxCommands::getLongResult);
+        static const CPmxGenericDataSerializer<CPmxThreeDataFormatter<8>, std::int32_t> serializer(
+            &CIPmxCommands::getLongResult);
         return serializer;
     }
     case eLongSingle: {
-        static const CPmxGenericDataSerializer<CPmxOneDataFormatter<8>, std::int32_t> serializer(&CIPmxCommands::getLongResult);
+        static const CPmxGenericDataSerializer<CPmxOneDataFormatter<8>, std::int32_t> serializer(
+            &CIPmxCommands::getLongResult);
         return serializer;
     }
     case eString: {

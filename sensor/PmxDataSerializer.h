@@ -48,29 +48,33 @@ inline bool isTextResult(EDataType type, std::uint32_t dataFormat)
 }
 
 // Text of one scalar: plain signed decimal for integers, formatFloat for floats.
-inline std::string formatValue(std::int32_t value) { return std::to_string(value); }
-inline std::string formatValue(float value) { return formatFloat(value); }
+inline std::string formatValue(std::int32_t value)
+{
+    return std::to_string(value);
+}
+inline std::string formatValue(float value)
+{
+    return formatFloat(value);
+}
 
 // The first value, as ASCII text in either data format. N is the data type served.
-template <int N>
-struct CPmxOneDataFormatter {
-    template <class Value>
-    static void format(CPmxDataBuffer& buffer, const Value (&values)[3]) { buffer.write(formatValue(values[0])); }
+template <int N> struct CPmxOneDataFormatter {
+    template <class Value> static void format(CPmxDataBuffer& buffer, const Value (&values)[3])
+    {
+        buffer.write(formatValue(values[0]));
+    }
 };
 
 // The three values, as ASCII text joined by ",", in either data format.
-template <int N>
-struct CPmxThreeDataFormatter {
-    template <class Value>
-    static void format(CPmxDataBuffer& buffer, const Value (&values)[3])
+template <int N> struct CPmxThreeDataFormatter {
+    template <class Value> static void format(CPmxDataBuffer& buffer, const Value (&values)[3])
     {
         buffer.write(formatValue(values[0]) + "," + formatValue(values[1]) + "," + formatValue(values[2]));
     }
 };
 
 // Binary: a block of the first value alone ("#14" and four bytes); ASCII: the three values.
-template <int N>
-struct CPmxStreamDataFormatter {
+template <int N> struct CPmxStreamDataFormatter {
     static void format(CPmxDataBuffer& buffer, const float (&values)[3])
     {
         writeFloats(buffer, values, buffer.getParent()->getDataFormat() == 1 ? 1 : 3);
@@ -78,12 +82,11 @@ struct CPmxStreamDataFormatter {
 };
 
 // Fetches three values with one commands operation and lets the formatter write them.
-template <class Formatter, class Value>
-class CPmxGenericDataSerializer : public CPmxDataSerializer {
+template <class Formatter, class Value> class CPmxGenericDataSerializer : public CPmxDataSerializer {
 public:
     typedef std::int32_t (CIPmxCommands::*COperation)(CPmxSession&, Value*, Value*, Value*);
 
-    explicit CPmxGenericDataSerializer(COperation operation) : m_pfOperation(operation) {}
+    explicit CPmxGenericDataSerializer(COperation operation) : m_pfOperation(operation) { }
 
     void serialize(CPmxDataBuffer& buffer) const override
     {
@@ -110,7 +113,7 @@ public:
     const CPmxDataSerializer& get(EDataType type) const;
 
 private:
-    CPmxDataSerializerFactory() {}
+    CPmxDataSerializerFactory() { }
 };
 
 } // namespace LbPmxVisa

@@ -18,7 +18,7 @@ CPmxErrorQueue::CPmxErrorQueue(CPmxSession* session) : LbCore::CParent<CPmxSessi
 
 // The session stops its event thread before its error queue goes, so no delivery can still be
 // running here.
-CPmxErrorQueue::~CPmxErrorQueue() {}
+CPmxErrorQueue::~CPmxErrorQueue() { }
 
 // The entry leaves the list only once it has been written: a reply that does not fit keeps it.
 // The lock is held across the write (a plain copy) so that an error recorded meanwhile cannot
@@ -28,7 +28,9 @@ void CPmxErrorQueue::serialize(CPmxDataBuffer& buffer) const
     LbCore::CLock<LbCore::CCriticalSection> lock(m_cLock);
     std::ostringstream text;
     if (m_cEntries.empty()) {
-        text << 0 << ", \"" << "No Error" << "\"";
+        text << 0 << ", \""
+             << "No Error"
+             << "\"";
         buffer.write(text.str());
         return;
     }
@@ -43,9 +45,9 @@ bool CPmxErrorQueue::isEmpty() const
     return m_cEntries.empty();
 }
 
-void CPmxErrorQueue::notifyCommandAcceptedEvent(const CPmxEvent&) {}
+void CPmxErrorQueue::notifyCommandAcceptedEvent(const CPmxEvent&) { }
 
-void CPmxErrorQueue::notifyDataAvailableEvent(const CPmxEvent&) {}
+void CPmxErrorQueue::notifyDataAvailableEvent(const CPmxEvent&) { }
 
 void CPmxErrorQueue::notifyErrorOccuredEvent(const CPmxEvent& event)
 {
@@ -55,13 +57,14 @@ void CPmxErrorQueue::notifyErrorOccuredEvent(const CPmxEvent& event)
     char text[1024] = {0};
     dispatcher->getCommands()->getErrorText(code, text, sizeof(text));
     text[sizeof(text) - 1] = 0; // a library that fills the whole buffer still yields a terminated text
-    s_cLogger.error("LbPmxVisa::CPmxErrorQueue::notifyErrorOccuredEvent") << "An Pmx-Error has been occurred on session " << session << " [Error: " << text << "]";
+    s_cLogger.error("LbPmxVisa::CPmxErrorQueue::notifyErrorOccuredEvent")
+        << "An Pmx-Error has been occurred on session " << session << " [Error: " << text << "]";
     LbCore::CLock<LbCore::CCriticalSection> lock(m_cLock);
     m_cEntries.push_back(std::make_pair(code, std::string(text)));
 }
 
-void CPmxErrorQueue::notifyStateChangedEvent(const CPmxEvent&) {}
+void CPmxErrorQueue::notifyStateChangedEvent(const CPmxEvent&) { }
 
-void CPmxErrorQueue::notifyDeviceChangedEvent(const CPmxEvent&) {}
+void CPmxErrorQueue::notifyDeviceChangedEvent(const CPmxEvent&) { }
 
 } // namespace LbPmxVisa

@@ -37,7 +37,7 @@ private:
     void notifyStateChangedEvent(const CPmxEvent& event) override;
     void notifyDeviceChangedEvent(const CPmxEvent& event) override;
 
-    mutable std::deque<std::pair<std::int32_t, std::string> > m_cEntries;
+    mutable std::deque<std::pair<std::int32_t, std::string>> m_cEntries;
     mutable LbCore::CCriticalSection m_cLock;
 };
 

@@ -48,7 +48,8 @@ void CPmxEventDispatcher::CPmxEventMessage::execute(const LbCore::CThread&)
 
 void CPmxEventDispatcher::CPmxEventMessage::deliver()
 {
-    s_cLogger.debug("LbPmxVisa::CPmxEventDispatcher::CPmxEventMessage::deliver") << "Delivering message for CPmxEventDispatcher ";
+    s_cLogger.debug("LbPmxVisa::CPmxEventDispatcher::CPmxEventMessage::deliver")
+        << "Delivering message for CPmxEventDispatcher ";
     getParent()->m_cListeners.notify(m_cEvent, m_pfOperation);
 }
 
@@ -82,7 +83,8 @@ void CPmxEventDispatcher::shutdown()
     }
     s_cLogger.debug("LbPmxVisa::CPmxEventDispatcher::~CPmxEventDispatcher") << "stopAndJoin(...)";
     m_cWorker.stopAndJoin(LbCore::CSemaphore::INFINITE_WAIT);
-    s_cLogger.debug("LbPmxVisa::CPmxEventDispatcher::~CPmxEventDispatcher") << "Thread has been stopped. Destruction continues...";
+    s_cLogger.debug("LbPmxVisa::CPmxEventDispatcher::~CPmxEventDispatcher")
+        << "Thread has been stopped. Destruction continues...";
 }
 
 bool CPmxEventDispatcher::addListener(CIPmxEventListener* listener)
@@ -128,7 +130,8 @@ void CPmxEventDispatcher::queue(const CPmxEvent& event, PmxNotification operatio
     try {
         message = new CPmxEventMessage(this, event, operation);
     } catch (const std::exception& e) {
-        s_cLogger.error("LbPmxVisa::CPmxEventDispatcher::queue") << "Could not create a message, event dropped: " << e.what();
+        s_cLogger.error("LbPmxVisa::CPmxEventDispatcher::queue")
+            << "Could not create a message, event dropped: " << e.what();
         return;
     }
     m_cQueue.push(message, 0);

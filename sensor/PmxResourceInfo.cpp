@@ -64,7 +64,7 @@ std::uint32_t parseModelCode(const std::string& field)
         value = value * base + static_cast<unsigned>(digit);
         if (value > 0xFFFFFFFFull) {
             overflow = true;
-            value = 0;  // keeps scanning the rest for non-digits without wrapping
+            value = 0; // keeps scanning the rest for non-digits without wrapping
         }
     }
     return overflow ? 0 : static_cast<std::uint32_t>(value);
@@ -76,12 +76,11 @@ CPmxResourceInfo::TModelTable buildModelTable()
         const char* text;
         std::uint32_t code;
     } rows[] = {
-        {"PMX", 2},       {"PMX-M01", 3},   {"PMX-M02", 4},   {"PMX-M03", 11},  {"PMX-M04", 12},
-        {"PMX-M05", 19},  {"PMX-M06", 20},  {"PMX-M07", 21},  {"PMX-M08", 81},  {"PMX-M09", 44},
-        {"PMX-M10", 154}, {"PMX-M11", 150}, {"PMX-M12", 151}, {"PMX-M13", 152}, {"PMX-M14", 26},
-        {"PMX-M15", 33},  {"PMX-M16", 98},  {"PMX-M17", 46},  {"PMX-M18", 82},  {"PMX-M19", 166},
-        {"PMX-M20", 167}, {"PMX-M21", 35},  {"PMX-M22", 131}, {"PMX-M23", 149}, {"PMX-M24", 47},
-        {"PMX-M25", 45},  {"PMX-M26", 22},  {"PMX-M27", 23},  {"PMX-M28", 24},  {"PMX-M29", 25},
+        {"PMX", 2},       {"PMX-M01", 3},   {"PMX-M02", 4},   {"PMX-M03", 11},  {"PMX-M04", 12},  {"PMX-M05", 19},
+        {"PMX-M06", 20},  {"PMX-M07", 21},  {"PMX-M08", 81},  {"PMX-M09", 44},  {"PMX-M10", 154}, {"PMX-M11", 150},
+        {"PMX-M12", 151}, {"PMX-M13", 152}, {"PMX-M14", 26},  {"PMX-M15", 33},  {"PMX-M16", 98},  {"PMX-M17", 46},
+        {"PMX-M18", 82},  {"PMX-M19", 166}, {"PMX-M20", 167}, {"PMX-M21", 35},  {"PMX-M22", 131}, {"PMX-M23", 149},
+        {"PMX-M24", 47},  {"PMX-M25", 45},  {"PMX-M26", 22},  {"PMX-M27", 23},  {"PMX-M28", 24},  {"PMX-M29", 25},
         {"PMX-M30", 112}, {"PMX-M31", 168}, {"PMX-M32", 143}, {"PMX-M33", 144},
     };
     CPmxResourceInfo::TModelTable table;
@@ -117,7 +116,7 @@ const CPmxResourceInfo::TModelTable& CPmxResourceInfo::getModelTable()
     return s_cTable;
 }
 
-CPmxResourceInfo::CPmxResourceInfo() : m_nModelCode(0) {}
+CPmxResourceInfo::CPmxResourceInfo() : m_nModelCode(0) { }
 
 CPmxResourceInfo::CPmxResourceInfo(const std::string& visaResource) : m_nModelCode(0)
 {
@@ -164,7 +163,8 @@ CPmxResourceInfo::CPmxResourceInfo(const std::string& typeText, const std::strin
     const TModelTable& table = getModelTable();
     const TModelTable::const_iterator row = table.find(typeText);
     if (row == table.end()) {
-        throw CPmxResourceInfoException("VISA Resource isn't well formatted. The type parameter " + typeText + " is unknown");
+        throw CPmxResourceInfoException("VISA Resource isn't well formatted. The type parameter " + typeText +
+                                        " is unknown");
     }
     m_nModelCode = row->second;
 }
@@ -178,14 +178,16 @@ std::string CPmxResourceInfo::CVisa::serialize(const CPmxResourceInfo& info) con
 {
     char code[16];
     std::snprintf(code, sizeof(code), "%04lx", static_cast<unsigned long>(info.getModelCode()));
-    return std::string(c_szPrefix) + c_szSeparator + c_szHexPrefix + code + c_szSeparator + info.getSerialNumber() + c_szSuffix;
+    return std::string(c_szPrefix) + c_szSeparator + c_szHexPrefix + code + c_szSeparator + info.getSerialNumber() +
+        c_szSuffix;
 }
 
 std::string CPmxResourceInfo::CPmx::serialize(const CPmxResourceInfo& info) const
 {
     char code[16];
     std::snprintf(code, sizeof(code), "%04lu", static_cast<unsigned long>(info.getModelCode()));
-    return std::string(c_szInterface) + c_szSeparator + c_szVendor + c_szSeparator + code + c_szSeparator + info.getSerialNumber();
+    return std::string(c_szInterface) + c_szSeparator + c_szVendor + c_szSeparator + code + c_szSeparator +
+        info.getSerialNumber();
 }
 
 } // namespace LbPmxVisa

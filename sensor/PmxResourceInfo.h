@@ -25,7 +25,7 @@ public:
 
     class CPmxResourceInfoException : public std::exception {
     public:
-        explicit CPmxResourceInfoException(const std::string& message) : m_sMessage(message) {}
+        explicit CPmxResourceInfoException(const std::string& message) : m_sMessage(message) { }
         const char* what() const noexcept override { return m_sMessage.c_str(); }
 
     private:

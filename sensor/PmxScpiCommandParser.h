@@ -18,17 +18,17 @@ namespace LbPmxVisa {
 class CPmxScpiCommandParser {
 public:
     enum ECommandType : std::int32_t {
-        COMMAND_OTHER = 0,                      // sent to the sensor unchanged
-        COMMAND_SYSTEM_ERROR_QUERY = 1,         // "SYSTem:ERRor?"
-        COMMAND_OPERATION_CONDITION_QUERY = 2,  // "STATus:OPERation:CONDition?"
-        COMMAND_FORMAT_ASCII = 3,               // "format ascii"
-        COMMAND_FORMAT_REAL32 = 4               // "format real,32"
+        COMMAND_OTHER = 0,                     // sent to the sensor unchanged
+        COMMAND_SYSTEM_ERROR_QUERY = 1,        // "SYSTem:ERRor?"
+        COMMAND_OPERATION_CONDITION_QUERY = 2, // "STATus:OPERation:CONDition?"
+        COMMAND_FORMAT_ASCII = 3,              // "format ascii"
+        COMMAND_FORMAT_REAL32 = 4              // "format real,32"
     };
 
     static CPmxScpiCommandParser& getInstance();
 
-    CPmxScpiCommandParser() {}
-    virtual ~CPmxScpiCommandParser() {}
+    CPmxScpiCommandParser() { }
+    virtual ~CPmxScpiCommandParser() { }
 
     ECommandType parse(const std::string& command) const;
     bool isSystemErrorQuery(const std::string& text) const;

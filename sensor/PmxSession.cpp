@@ -33,10 +33,10 @@ unsigned toWait(std::uint64_t timeoutMs)
 // the last byte, termination character line feed, not enabled.
 CPmxSession::CPmxSession(CPmxSessionDispatcher* dispatcher, const CPmxResourceInfo& resource)
     : LbCore::CParent<CPmxSessionDispatcher>(dispatcher), m_cResourceInfo(resource),
-      m_pcState(CIPmxSessionState::noData()), m_cStateLock(), m_lHandle(0), m_cEventDispatcher(this), m_nCommandCount(0),
-      m_nMessageCount(0), m_lBusy(0), m_cDataSemaphore(0), m_cMessageQueue(10), m_cErrorQueue(this), m_nTimeout(5000),
-      m_nDataFormat(0), m_nSuppressEndEnabled(0), m_nSendEndEnabled(1), m_nTermCharEnabled(0), m_nTermChar('\n'),
-      m_bReplyHeld(false), m_bSensorRemoved(false)
+      m_pcState(CIPmxSessionState::noData()), m_cStateLock(), m_lHandle(0), m_cEventDispatcher(this),
+      m_nCommandCount(0), m_nMessageCount(0), m_lBusy(0), m_cDataSemaphore(0), m_cMessageQueue(10), m_cErrorQueue(this),
+      m_nTimeout(5000), m_nDataFormat(0), m_nSuppressEndEnabled(0), m_nSendEndEnabled(1), m_nTermCharEnabled(0),
+      m_nTermChar('\n'), m_bReplyHeld(false), m_bSensorRemoved(false)
 {
 }
 
@@ -50,15 +50,15 @@ CPmxSession::~CPmxSession()
             getParent()->callChecked(&CIPmxCommands::closeSensor, *this);
             s_cLogger.info("LbPmxVisa::CPmxSession::~CPmxSession") << "Session closed successfully";
         } catch (const std::exception& e) {
-            s_cLogger.error("LbPmxVisa::CPmxSession::~CPmxSession") << "Closing session " << this
-                              << " failed: " << e.what();
+            s_cLogger.error("LbPmxVisa::CPmxSession::~CPmxSession")
+                << "Closing session " << this << " failed: " << e.what();
         }
         m_cMessageQueue.interrupt();
         try {
             getParent()->detach(*this);
         } catch (const std::exception& e) {
-            s_cLogger.error("LbPmxVisa::CPmxSession::~CPmxSession") << "Leaving the dispatcher failed for session "
-                              << this << ": " << e.what();
+            s_cLogger.error("LbPmxVisa::CPmxSession::~CPmxSession")
+                << "Leaving the dispatcher failed for session " << this << ": " << e.what();
         }
     } else {
         try {
@@ -92,13 +92,14 @@ void CPmxSession::execute(const CSessionCommand& command)
         const_cast<CSessionCommand&>(command).execute(*this);
     } catch (...) {
         if (LbCore::interlockedCompareExchange(&m_lBusy, 0, 1) != 1) {
-            s_cLogger.error("LbPmxVisa::CPmxSession::execute") << "::InterlockedCompareExchange failed for session " << this;
+            s_cLogger.error("LbPmxVisa::CPmxSession::execute")
+                << "::InterlockedCompareExchange failed for session " << this;
         }
         throw;
     }
     if (LbCore::interlockedCompareExchange(&m_lBusy, 0, 1) != 1) {
-        s_cLogger.error("LbPmxVisa::CPmxSession::execute") << "::InterlockedCompareExchange failed for session "
-                          << this;
+        s_cLogger.error("LbPmxVisa::CPmxSession::execute")
+            << "::InterlockedCompareExchange failed for session " << this;
     }
 }
 
@@ -114,7 +115,8 @@ void CPmxSession::takeAcknowledgement()
         std::uint64_t left = timeout;
         if (timeout < LbCore::CSemaphore::INFINITE_WAIT) {
             const std::uint64_t spent = static_cast<std::uint64_t>(
-                std::chrono::duration_cast<std::chrono::milliseconds>(std::chrono::steady_clock::now() - start).count());
+                std::chrono::duration_cast<std::chrono::milliseconds>(std::chrono::steady_clock::now() - start)
+                    .count());
             left = spent >= timeout ? 0 : timeout - spent;
         }
         CPmxSessionMessage* message = nullptr;
@@ -153,13 +155,14 @@ void CPmxSession::write(const std::string& command)
 {
     class CWriteCommand : public CSessionCommand {
     public:
-        explicit CWriteCommand(const std::string& text) : m_sText(text) {}
+        explicit CWriteCommand(const std::string& text) : m_sText(text) { }
 
         void execute(CPmxSession& session) override
         {
             std::string head = m_sText.substr(0, m_sText.find_first_of("\r\n"));
             if (scpiCompare("FETCh?", head.c_str()) == 0) {
-                s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "fetch command executed " << &session;
+                s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute")
+                    << "fetch command executed " << &session;
                 return;
             }
             session.dropReply();
@@ -170,7 +173,8 @@ void CPmxSession::write(const std::string& command)
             // answer when the sensor answers at once, and the writer would wait in vain.
             int result = CMessageQueue::RESULT_ITEM;
             while (session.m_nMessageCount + 1 < session.m_nCommandCount && result == CMessageQueue::RESULT_ITEM) {
-                s_cLogger.warn("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "Asynchronous Message detected! Will be deleted to ensure stable further working!";
+                s_cLogger.warn("LbPmxVisa::CPmxSession::write::CWriteCommand::execute")
+                    << "Asynchronous Message detected! Will be deleted to ensure stable further working!";
                 if (session.m_cMessageQueue.size() >= 1) {
                     CPmxSessionMessage* stale = nullptr;
                     result = session.m_cMessageQueue.pop(stale, 0);
@@ -184,7 +188,8 @@ void CPmxSession::write(const std::string& command)
             session.changeState(CIPmxSessionState::noData());
             CPmxSessionDispatcher* dispatcher = session.getParent();
             dispatcher->callChecked(&CIPmxCommands::emptyAllBuffers, session);
-            s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "Execute PmxSendCommand(...) [" << m_sText << "] for session " << &session;
+            s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute")
+                << "Execute PmxSendCommand(...) [" << m_sText << "] for session " << &session;
             dispatcher->callChecked(&CIPmxCommands::sendCommand, session, m_sText);
 
             // Set before the removal message is queued: a writer that misses the message sees the flag.
@@ -193,15 +198,17 @@ void CPmxSession::write(const std::string& command)
             }
             CPmxSessionMessage* message = nullptr;
             if (session.m_cMessageQueue.pop(message, toWait(session.m_nTimeout)) != CMessageQueue::RESULT_ITEM) {
-                s_cLogger.info("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "No message arrived for session " << &session;
+                s_cLogger.info("LbPmxVisa::CPmxSession::write::CWriteCommand::execute")
+                    << "No message arrived for session " << &session;
                 ++session.m_nMessageCount;
                 return;
             }
             std::unique_ptr<CPmxSessionMessage> owner(message);
-            s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "Message arrived "
-                              << session.m_nMessageCount << " / " << session.m_nCommandCount << " for session "
-                              << &session;
-            s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute") << "Delivering message for session " << &session;
+            s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute")
+                << "Message arrived " << session.m_nMessageCount << " / " << session.m_nCommandCount << " for session "
+                << &session;
+            s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute")
+                << "Delivering message for session " << &session;
             try {
                 owner->deliver();
             } catch (const CPmxSessionDispatcher::CPmxCommandException&) {
@@ -216,7 +223,7 @@ void CPmxSession::write(const std::string& command)
         const std::string& m_sText;
     };
 
-    typedef boost::tokenizer<boost::char_separator<char> > CTokenizer;
+    typedef boost::tokenizer<boost::char_separator<char>> CTokenizer;
     static const boost::char_separator<char> s_cSeparator(";", "", boost::drop_empty_tokens);
     CTokenizer tokens(command, s_cSeparator);
     for (CTokenizer::iterator it = tokens.begin(); it != tokens.end(); ++it) {
@@ -227,8 +234,7 @@ void CPmxSession::write(const std::string& command)
         if (!token.empty() && token[0] == ':') {
             token.erase(0, 1);
         }
-        s_cLogger.info("LbPmxVisa::CPmxSession::write") << "Writing to Session " << this << " with command "
-                         << token;
+        s_cLogger.info("LbPmxVisa::CPmxSession::write") << "Writing to Session " << this << " with command " << token;
         switch (CPmxScpiCommandParser::getInstance().parse(token)) {
         case CPmxScpiCommandParser::COMMAND_SYSTEM_ERROR_QUERY: {
             class CErrorQueueCommand : public CSessionCommand {
@@ -275,11 +281,12 @@ void CPmxSession::read(CPmxDataBuffer& buffer)
 {
     class CReadCommand : public CSessionCommand {
     public:
-        explicit CReadCommand(CPmxDataBuffer& buffer) : m_rBuffer(buffer) {}
+        explicit CReadCommand(CPmxDataBuffer& buffer) : m_rBuffer(buffer) { }
 
         void execute(CPmxSession& session) override
         {
-            s_cLogger.debug("LbPmxVisa::CPmxSession::read::CReadCommand::execute") << "Executing GetData(...) method for fetching Pmx-Data for session " << &session;
+            s_cLogger.debug("LbPmxVisa::CPmxSession::read::CReadCommand::execute")
+                << "Executing GetData(...) method for fetching Pmx-Data for session " << &session;
             CPmxDataBuffer::CSpill& reply = session.m_cReply;
             m_rBuffer.setSpill(&reply);
             if (session.m_bReplyHeld) {
@@ -343,8 +350,7 @@ void CPmxSession::clear()
     public:
         void execute(CPmxSession& session) override
         {
-            s_cLogger.info("LbPmxVisa::CPmxSession::clear::CClearCommand::execute") << "Clearing session "
-                             << &session;
+            s_cLogger.info("LbPmxVisa::CPmxSession::clear::CClearCommand::execute") << "Clearing session " << &session;
             session.getParent()->callChecked(&CIPmxCommands::clearDevice, session);
             // The device has discarded its results: nothing is pending any more, so the status
             // byte and the next read agree (a read waits as on a fresh session). A remembered
@@ -369,13 +375,14 @@ void CPmxSession::changeState(const CIPmxSessionState* target)
 {
     LbCore::CLock<LbCore::CCriticalSection> lock(m_cStateLock);
     const CIPmxSessionState* current = m_pcState.load();
-    s_cLogger.debug("LbPmxVisa::CPmxSession::changeState") << "Changing state from " << current->getName()
-                      << " to " << target->getName() << " for session " << this;
+    s_cLogger.debug("LbPmxVisa::CPmxSession::changeState")
+        << "Changing state from " << current->getName() << " to " << target->getName() << " for session " << this;
     try {
         m_pcState = current->nextState(*this, target);
     } catch (const CIPmxSessionState::CPmxInvalidStateException&) {
-        s_cLogger.debug("LbPmxVisa::CPmxSession::changeState") << "---ERROR-- CPmxInvalidStateException "
-                          << "Can't change state from " << current->getName() << " into state " << target->getName();
+        s_cLogger.debug("LbPmxVisa::CPmxSession::changeState")
+            << "---ERROR-- CPmxInvalidStateException "
+            << "Can't change state from " << current->getName() << " into state " << target->getName();
     }
 }
 

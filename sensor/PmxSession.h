@@ -50,7 +50,7 @@ public:
     // A notification handed from the event thread to a waiting writer.
     class CPmxSessionMessage : public LbCore::CMemoryPool::CMemoryPoolManaged {
     public:
-        ~CPmxSessionMessage() override {}
+        ~CPmxSessionMessage() override { }
         virtual void deliver() = 0;
     };
 

@@ -69,8 +69,9 @@ void CPmxSessionDispatcher::detach(CIPmxCommands* commands)
         return;
     }
     if (self.getActiveSessionCount() != 0) {
-        s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::detach") << "Commands interface will be detached, when still some sessions are open. "
-                          << "This behavior is resulting in a undefined state";
+        s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::detach")
+            << "Commands interface will be detached, when still some sessions are open. "
+            << "This behavior is resulting in a undefined state";
     }
     self.m_pcCommand = nullptr;
 }
@@ -100,17 +101,18 @@ boost::shared_ptr<CPmxSession> CPmxSessionDispatcher::getSession(const CPmxResou
     boost::shared_ptr<CPmxSession> dead; // released outside the map lock
     {
         CMapGuard guard(m_cMapLock);
-        std::unordered_map<std::string, boost::weak_ptr<CPmxSession> >::iterator found = m_cResourceMap.find(key);
+        std::unordered_map<std::string, boost::weak_ptr<CPmxSession>>::iterator found = m_cResourceMap.find(key);
         // An expired entry belongs to a session whose destructor is running and has not left
         // the map yet; a new session is made instead of failing with bad_weak_ptr, and the dying
         // one leaves only its own entry (see detach).
-        boost::shared_ptr<CPmxSession> session = found != m_cResourceMap.end() ? found->second.lock()
-                                                                               : boost::shared_ptr<CPmxSession>();
+        boost::shared_ptr<CPmxSession> session =
+            found != m_cResourceMap.end() ? found->second.lock() : boost::shared_ptr<CPmxSession>();
         // A session whose sensor was removed stays with the VISA sessions that hold it, dead; a
         // re-attached sensor gets a new one. The dead one leaves both maps now (no event names
         // its handle any more); its destructor then finds nothing of its own to remove.
         if (session && session->isSensorRemoved()) {
-            std::unordered_map<std::int64_t, CPmxSession*>::iterator byHandle = m_cSessionMap.find(session->getHandle());
+            std::unordered_map<std::int64_t, CPmxSession*>::iterator byHandle =
+                m_cSessionMap.find(session->getHandle());
             if (byHandle != m_cSessionMap.end() && byHandle->second == session.get()) {
                 m_cSessionMap.erase(byHandle);
             }
@@ -118,8 +120,8 @@ boost::shared_ptr<CPmxSession> CPmxSessionDispatcher::getSession(const CPmxResou
             dead.swap(session);
         }
         if (session) {
-            s_cLogger.info("LbPmxVisa::CPmxSessionDispatcher::getSession") << "Recycle session for "
-                             << g_pcVisaSerializer->serialize(session->getResourceInfo());
+            s_cLogger.info("LbPmxVisa::CPmxSessionDispatcher::getSession")
+                << "Recycle session for " << g_pcVisaSerializer->serialize(session->getResourceInfo());
             return session;
         }
     }
@@ -143,8 +145,7 @@ std::vector<CPmxResourceInfo> CPmxSessionDispatcher::getAvailableDevices()
     std::int32_t count = 0;
     s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Getting device list length...";
     callChecked(&CIPmxCommands::getDeviceListLength, &count);
-    s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Found " << count
-                      << " device(s)...";
+    s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Found " << count << " device(s)...";
 
     std::vector<CPmxResourceInfo> devices;
     for (std::int32_t index = 0; index < count; ++index) {
@@ -157,21 +158,23 @@ std::vector<CPmxResourceInfo> CPmxSessionDispatcher::getAvailableDevices()
         try {
             callChecked(&CIPmxCommands::getDeviceInfo, index, name, type, serial, &flag);
         } catch (const CPmxCommandException& e) {
-            s_cLogger.warn("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Skipping device "
-                             << index << ", its information could not be read: " << e.what();
+            s_cLogger.warn("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices")
+                << "Skipping device " << index << ", its information could not be read: " << e.what();
             continue;
         }
-        s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Adding device "
-                          << type << ";" << serial;
+        s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices")
+            << "Adding device " << type << ";" << serial;
         if (flag == 0) {
             continue;
         }
         try {
             devices.push_back(CPmxResourceInfo(type, serial));
         } catch (const std::exception& e) {
-            s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Exception during adding to the resource info: " << e.what();
+            s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices")
+                << "Exception during adding to the resource info: " << e.what();
         } catch (...) {
-            s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices") << "Unknown exception during adding to the resource info";
+            s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices")
+                << "Unknown exception during adding to the resource info";
         }
     }
     if (getCommands()->isDriverOpen() && getActiveSessionCount() == 0) {
@@ -184,7 +187,8 @@ unsigned CPmxSessionDispatcher::getActiveSessionCount()
 {
     CMapGuard guard(m_cMapLock);
     if (m_cSessionMap.size() != m_cResourceMap.size()) {
-        s_cLogger.warn("LbPmxVisa::CPmxSessionDispatcher::getActiveSessionCount") << "Session-Map and the Resource-Map are inconsistent!";
+        s_cLogger.warn("LbPmxVisa::CPmxSessionDispatcher::getActiveSessionCount")
+            << "Session-Map and the Resource-Map are inconsistent!";
     }
     return static_cast<unsigned>(m_cResourceMap.size());
 }
@@ -205,13 +209,14 @@ void CPmxSessionDispatcher::detach(CPmxSession& session)
         }
         // Only the leaving session's own entry goes: its weak reference has expired, while a
         // live entry under the same key belongs to a newer session of that resource.
-        std::unordered_map<std::string, boost::weak_ptr<CPmxSession> >::iterator byName =
+        std::unordered_map<std::string, boost::weak_ptr<CPmxSession>>::iterator byName =
             m_cResourceMap.find(g_pcVisaSerializer->serialize(session.getResourceInfo()));
         if (byName != m_cResourceMap.end() && byName->second.expired()) {
             m_cResourceMap.erase(byName);
         }
         if (m_cSessionMap.size() != m_cResourceMap.size()) {
-            s_cLogger.warn("LbPmxVisa::CPmxSessionDispatcher::detach") << "Session-Map and the Resource-Map are inconsistent!";
+            s_cLogger.warn("LbPmxVisa::CPmxSessionDispatcher::detach")
+                << "Session-Map and the Resource-Map are inconsistent!";
         }
     }
     // Outside the map lock: closing the driver waits for the library's callback thread, which
@@ -234,12 +239,13 @@ void CPmxSessionDispatcher::findAndNotify(const CPmxEvent& event, PmxNotificatio
     CMapGuard guard(m_cMapLock);
     std::unordered_map<std::int64_t, CPmxSession*>::iterator found = m_cSessionMap.find(event.handle);
     if (found == m_cSessionMap.end()) {
-        s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::findAndNotify") << "Could not find a event listener for session " << event.handle;
+        s_cLogger.error("LbPmxVisa::CPmxSessionDispatcher::findAndNotify")
+            << "Could not find a event listener for session " << event.handle;
         return;
     }
     CPmxSession* session = found->second;
-    s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::findAndNotify") << "Firing event " << event.value
-                      << " for session " << session;
+    s_cLogger.debug("LbPmxVisa::CPmxSessionDispatcher::findAndNotify")
+        << "Firing event " << event.value << " for session " << session;
     CIPmxEventListener& listener = session->getEventDispatcher();
     (listener.*operation)(event);
 }

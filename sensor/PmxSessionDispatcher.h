@@ -81,7 +81,7 @@ private:
     CPmxSessionDispatcher();
     ~CPmxSessionDispatcher() override;
 
-    std::unordered_map<std::string, boost::weak_ptr<CPmxSession> > m_cResourceMap;
+    std::unordered_map<std::string, boost::weak_ptr<CPmxSession>> m_cResourceMap;
     std::unordered_map<std::int64_t, CPmxSession*> m_cSessionMap;
     std::atomic<CIPmxCommands*> m_pcCommand;
     std::string m_sManufacturerName;

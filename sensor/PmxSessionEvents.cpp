@@ -19,8 +19,7 @@ namespace {
 // message the waiting writer simply sees no answer and ends at its time-out.
 void logLostMessage(const CPmxSession* session)
 {
-    s_cLogger.error("LbPmxVisa::CPmxSession::notify") << "Could not create a message for session "
-                      << session;
+    s_cLogger.error("LbPmxVisa::CPmxSession::notify") << "Could not create a message for session " << session;
 }
 
 } // namespace
@@ -58,7 +57,7 @@ void CPmxSession::notifyCommandAcceptedEvent(const CPmxEvent&)
 {
     class CPmxCommandAcceptedEventMessage : public CPmxSessionMessage {
     public:
-        void deliver() override {}
+        void deliver() override { }
     };
     CPmxSessionMessage* message = new (std::nothrow) CPmxCommandAcceptedEventMessage();
     if (message == nullptr) {
@@ -77,7 +76,7 @@ void CPmxSession::notifyErrorOccuredEvent(const CPmxEvent& event)
 {
     class CPmxCommandErrorEventMessage : public CPmxSessionMessage {
     public:
-        explicit CPmxCommandErrorEventMessage(const CPmxEvent& event) : m_cEvent(event) {}
+        explicit CPmxCommandErrorEventMessage(const CPmxEvent& event) : m_cEvent(event) { }
         void deliver() override { throw CPmxSessionDispatcher::CPmxCommandException(m_cEvent.value); }
 
     private:
@@ -91,7 +90,7 @@ void CPmxSession::notifyErrorOccuredEvent(const CPmxEvent& event)
     m_cMessageQueue.push(message, 0);
 }
 
-void CPmxSession::notifyStateChangedEvent(const CPmxEvent&) {}
+void CPmxSession::notifyStateChangedEvent(const CPmxEvent&) { }
 
 // The notification names no sensor. A session keeps its state while its own sensor is still
 // listed; when the sensor has gone, the session is dead: a waiting writer is woken with the
@@ -106,12 +105,14 @@ void CPmxSession::notifyDeviceChangedEvent(const CPmxEvent&)
     bool removed = false;
     try {
         if (isSensorAttached()) {
-            s_cLogger.debug("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent") << "Sensor still attached, nothing changes for session " << this;
+            s_cLogger.debug("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent")
+                << "Sensor still attached, nothing changes for session " << this;
             return;
         }
         removed = true;
     } catch (const std::exception& e) {
-        s_cLogger.warn("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent") << "Could not read the device list: " << e.what();
+        s_cLogger.warn("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent")
+            << "Could not read the device list: " << e.what();
     }
     clearMessages();
     if (removed) {
@@ -123,8 +124,8 @@ void CPmxSession::notifyDeviceChangedEvent(const CPmxEvent&)
             m_cMessageQueue.push(message, 0);
         }
     }
-    s_cLogger.warn("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent") << "Device has been changed for session "
-                     << this;
+    s_cLogger.warn("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent")
+        << "Device has been changed for session " << this;
     changeState(CIPmxSessionState::noData());
 }
 

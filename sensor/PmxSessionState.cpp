@@ -13,7 +13,8 @@ namespace LbPmxVisa {
 
 typedef CIPmxSessionState CState;
 
-CState::CPmxInvalidStateException::CPmxInvalidStateException(const CIPmxSessionState& current, const CIPmxSessionState& target)
+CState::CPmxInvalidStateException::CPmxInvalidStateException(const CIPmxSessionState& current,
+                                                             const CIPmxSessionState& target)
     : m_sMessage("Can't change state from " + current.getName() + " into state " + target.getName())
 {
 }
@@ -56,7 +57,7 @@ public:
         CPmxSession* session = buffer.getParent();
         std::uint64_t timeout = session->getTimeout();
         unsigned waitMs = timeout >= LbCore::CSemaphore::INFINITE_WAIT ? LbCore::CSemaphore::INFINITE_WAIT
-                                                                        : static_cast<unsigned>(timeout);
+                                                                       : static_cast<unsigned>(timeout);
         for (;;) {
             if (!session->getDataSemaphore().wait(waitMs)) {
                 throw CPmxNoDataAvailableException();
@@ -245,7 +246,8 @@ public:
     std::string getName() const override { return "PmxOpStatusRegDataAvailable_ToNoData"; }
 };
 
-class CIPmxSessionState::CPmxOpStatusRegDataAvailable_ToPmxDataAvailable : public CPmxOpStatusRegDataAvailable_ToNoData {
+class CIPmxSessionState::CPmxOpStatusRegDataAvailable_ToPmxDataAvailable
+    : public CPmxOpStatusRegDataAvailable_ToNoData {
 public:
     const CState* nextState(CPmxSession&, const CState* target) const override
     {

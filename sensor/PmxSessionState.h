@@ -47,7 +47,7 @@ public:
     static const CIPmxSessionState* opStatusToNoData();
     static const CIPmxSessionState* opStatusToPmxDataAvailable();
 
-    ~CIPmxSessionState() override {}
+    ~CIPmxSessionState() override { }
     void serialize(CPmxDataBuffer& buffer) const override = 0;
     virtual const CIPmxSessionState* nextState(CPmxSession& session, const CIPmxSessionState* target) const = 0;
     virtual std::string getName() const = 0;

@@ -16,41 +16,41 @@
 namespace LbVisaHost {
 
 class CFormatError : public std::runtime_error {
- public:
-  using std::runtime_error::runtime_error;
+public:
+    using std::runtime_error::runtime_error;
 };
 
 // Where a count (array size, width, precision) comes from.
 enum class ECount { None, Fixed, Argument, InOut };
 
 struct SConversion {
-  char m_cCode = 0;
-  std::string m_strFlags;  // printf flags, in order
-  bool m_bSuppress = false;  // scanf "%*d"
-  bool m_bArray = false;
-  ECount m_eArray = ECount::None;
-  int m_nArray = 0;
-  ECount m_eWidth = ECount::None;
-  int m_nWidth = 0;
-  ECount m_ePrecision = ECount::None;
-  int m_nPrecision = 0;
-  std::string m_strModifier;  // "", "h", "l", "ll", "L", "z", "Z"
-  bool m_bLittleEndian = false;  // !ol
-  std::string m_strSet;  // %[...] without the brackets and the '^'
-  bool m_bSetNegated = false;
+    char m_cCode = 0;
+    std::string m_strFlags;   // printf flags, in order
+    bool m_bSuppress = false; // scanf "%*d"
+    bool m_bArray = false;
+    ECount m_eArray = ECount::None;
+    int m_nArray = 0;
+    ECount m_eWidth = ECount::None;
+    int m_nWidth = 0;
+    ECount m_ePrecision = ECount::None;
+    int m_nPrecision = 0;
+    std::string m_strModifier;    // "", "h", "l", "ll", "L", "z", "Z"
+    bool m_bLittleEndian = false; // !ol
+    std::string m_strSet;         // %[...] without the brackets and the '^'
+    bool m_bSetNegated = false;
 };
 
 struct SFormatItem {
-  bool m_bLiteral = true;
-  std::string m_strText;  // literal text
-  SConversion m_sConv;
+    bool m_bLiteral = true;
+    std::string m_strText; // literal text
+    SConversion m_sConv;
 };
 
 // Largest width, precision or array size written in a format.
 const int g_nMaxFormatCount = 1 << 24;
 
-std::vector<SFormatItem> parseFormat(const std::string &strFormat, bool bScan);
+std::vector<SFormatItem> parseFormat(const std::string& strFormat, bool bScan);
 
-}  // namespace LbVisaHost
+} // namespace LbVisaHost
 
 #endif

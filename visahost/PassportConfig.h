@@ -16,28 +16,27 @@ namespace LbVisaHost {
 namespace PassportConfig {
 
 struct SPassports {
-  std::vector<std::string> m_vPaths;
-  bool m_bConfigured = false;  // false: only the default passport, whose absence is no error
+    std::vector<std::string> m_vPaths;
+    bool m_bConfigured = false; // false: only the default passport, whose absence is no error
 };
 
 // The passports of this process, read from the environment and the system configuration.
 SPassports passports();
 
 // The non-empty entries of a list, in order.
-std::vector<std::string> splitList(const std::string &strList, char cSeparator);
+std::vector<std::string> splitList(const std::string& strList, char cSeparator);
 
 // Folder of passport configuration files (with a trailing '/') for a runtime whose libraries
 // are in strRuntimeDir (with a trailing separator), when that folder is <prefix>/<strLibDir>;
 // empty when the runtime is not installed that way (a build tree).
-std::string configDirectory(const std::string &strRuntimeDir, const std::string &strLibDir);
+std::string configDirectory(const std::string& strRuntimeDir, const std::string& strLibDir);
 
 // Module paths listed by the files "*.conf" in strDir, files in name order and lines in file
 // order. A line holds one path; blanks around it, empty lines and lines starting with '#' are
 // ignored; a relative path is taken from strRuntimeDir. A missing folder lists nothing.
-std::vector<std::string> readConfigDirectory(const std::string &strDir,
-                                             const std::string &strRuntimeDir);
+std::vector<std::string> readConfigDirectory(const std::string& strDir, const std::string& strRuntimeDir);
 
-}  // namespace PassportConfig
-}  // namespace LbVisaHost
+} // namespace PassportConfig
+} // namespace LbVisaHost
 
 #endif

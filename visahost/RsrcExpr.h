@@ -18,33 +18,33 @@ namespace LbVisaHost {
 
 // One condition of an attribute expression.
 struct SAttrCondition {
-  ViAttr m_nAttr = 0;
-  ViUInt16 m_nOp = 0;  // LBVISA_OP_*
-  bool m_bText = false;
-  ViAttrState m_nValue = 0;
-  std::string m_strText;
+    ViAttr m_nAttr = 0;
+    ViUInt16 m_nOp = 0; // LBVISA_OP_*
+    bool m_bText = false;
+    ViAttrState m_nValue = 0;
+    std::string m_strText;
 };
 
 class CRsrcExpr {
- public:
-  using CInvalidExpression = LbVisaHost::CInvalidExpression;
-  // Answers whether the resource satisfies one condition.
-  using FCondition = std::function<bool(const SAttrCondition &)>;
+public:
+    using CInvalidExpression = LbVisaHost::CInvalidExpression;
+    // Answers whether the resource satisfies one condition.
+    using FCondition = std::function<bool(const SAttrCondition&)>;
 
-  explicit CRsrcExpr(const std::string &strExpr);
-  bool matches(const std::string &strRsrc) const;
-  bool hasAttributes() const { return !m_strAttributes.empty(); }
-  // Evaluates the attribute expression (true when there is none).
-  bool matchesAttributes(const FCondition &fCondition) const;
+    explicit CRsrcExpr(const std::string& strExpr);
+    bool matches(const std::string& strRsrc) const;
+    bool hasAttributes() const { return !m_strAttributes.empty(); }
+    // Evaluates the attribute expression (true when there is none).
+    bool matchesAttributes(const FCondition& fCondition) const;
 
-  // Whether text matches a VISA regular expression (see VisaRegex.h); throws CInvalidExpression.
-  static bool matchesRegex(const std::string &strVisaRegex, const std::string &strText);
+    // Whether text matches a VISA regular expression (see VisaRegex.h); throws CInvalidExpression.
+    static bool matchesRegex(const std::string& strVisaRegex, const std::string& strText);
 
- private:
-  CVisaRegex m_cRegex;
-  std::string m_strAttributes;
+private:
+    CVisaRegex m_cRegex;
+    std::string m_strAttributes;
 };
 
-}  // namespace LbVisaHost
+} // namespace LbVisaHost
 
 #endif

@@ -7,19 +7,20 @@
 
 namespace LbVisaHost {
 
-inline const LbVisaHostApi &api() {
-  static const LbVisaHostApi *s_psApi = lbVisaHostApi();
-  return *s_psApi;
+inline const LbVisaHostApi& api()
+{
+    static const LbVisaHostApi* s_psApi = lbVisaHostApi();
+    return *s_psApi;
 }
 
 // VI_ERROR_NSUP_OPER for an object of the runtime, VI_ERROR_INV_OBJECT for anything else.
-inline ViStatus unsupported(ViObject nVi) {
-  ViAccessMode nState = 0;
-  return api().getAttribute(nVi, VI_ATTR_RSRC_LOCK_STATE, &nState) == VI_ERROR_INV_OBJECT
-             ? VI_ERROR_INV_OBJECT
-             : VI_ERROR_NSUP_OPER;
+inline ViStatus unsupported(ViObject nVi)
+{
+    ViAccessMode nState = 0;
+    return api().getAttribute(nVi, VI_ATTR_RSRC_LOCK_STATE, &nState) == VI_ERROR_INV_OBJECT ? VI_ERROR_INV_OBJECT
+                                                                                            : VI_ERROR_NSUP_OPER;
 }
 
-}  // namespace LbVisaHost
+} // namespace LbVisaHost
 
 #endif

@@ -19,31 +19,31 @@
 namespace LbVisaHost {
 
 class CInvalidExpression : public std::runtime_error {
- public:
-  using std::runtime_error::runtime_error;
+public:
+    using std::runtime_error::runtime_error;
 };
 
 const unsigned g_nMaxRegexNesting = 64;
 
 class CVisaRegex {
- public:
-  explicit CVisaRegex(const std::string &strExpr);
-  bool matches(const std::string &strText) const;
+public:
+    explicit CVisaRegex(const std::string& strExpr);
+    bool matches(const std::string& strText) const;
 
- private:
-  enum EOp { OP_CONSUME, OP_SPLIT, OP_JUMP, OP_MATCH };
-  struct SInst {
-    EOp m_eOp;
-    size_t m_nX;  // OP_CONSUME: index of the character set; OP_SPLIT / OP_JUMP: target
-    size_t m_nY;  // OP_SPLIT: second target
-  };
-  class CParser;
-  void addState(std::vector<size_t> &vList, std::vector<char> &vOn, size_t nStart) const;
+private:
+    enum EOp { OP_CONSUME, OP_SPLIT, OP_JUMP, OP_MATCH };
+    struct SInst {
+        EOp m_eOp;
+        size_t m_nX; // OP_CONSUME: index of the character set; OP_SPLIT / OP_JUMP: target
+        size_t m_nY; // OP_SPLIT: second target
+    };
+    class CParser;
+    void addState(std::vector<size_t>& vList, std::vector<char>& vOn, size_t nStart) const;
 
-  std::vector<SInst> m_vProgram;
-  std::vector<std::bitset<256>> m_vSets;
+    std::vector<SInst> m_vProgram;
+    std::vector<std::bitset<256>> m_vSets;
 };
 
-}  // namespace LbVisaHost
+} // namespace LbVisaHost
 
 #endif

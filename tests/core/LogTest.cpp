@@ -32,20 +32,47 @@ void* operator new(std::size_t size)
     }
     throw std::bad_alloc();
 }
-void* operator new[](std::size_t size) { return operator new(size); }
-void* operator new(std::size_t size, const std::nothrow_t&) noexcept { return countedAllocation(size); }
-void* operator new[](std::size_t size, const std::nothrow_t&) noexcept { return countedAllocation(size); }
+void* operator new[](std::size_t size)
+{
+    return operator new(size);
+}
+void* operator new(std::size_t size, const std::nothrow_t&) noexcept
+{
+    return countedAllocation(size);
+}
+void* operator new[](std::size_t size, const std::nothrow_t&) noexcept
+{
+    return countedAllocation(size);
+}
 // GCC takes free() after an inlined operator new for a mismatch; here both are malloc's.
 #if defined(__GNUC__) && !defined(__clang__)
 #pragma GCC diagnostic push
 #pragma GCC diagnostic ignored "-Wmismatched-new-delete"
 #endif
-void operator delete(void* memory) noexcept { std::free(memory); }
-void operator delete(void* memory, std::size_t) noexcept { std::free(memory); }
-void operator delete[](void* memory) noexcept { std::free(memory); }
-void operator delete[](void* memory, std::size_t) noexcept { std::free(memory); }
-void operator delete(void* memory, const std::nothrow_t&) noexcept { std::free(memory); }
-void operator delete[](void* memory, const std::nothrow_t&) noexcept { std::free(memory); }
+void operator delete(void* memory) noexcept
+{
+    std::free(memory);
+}
+void operator delete(void* memory, std::size_t) noexcept
+{
+    std::free(memory);
+}
+void operator delete[](void* memory) noexcept
+{
+    std::free(memory);
+}
+void operator delete[](void* memory, std::size_t) noexcept
+{
+    std::free(memory);
+}
+void operator delete(void* memory, const std::nothrow_t&) noexcept
+{
+    std::free(memory);
+}
+void operator delete[](void* memory, const std::nothrow_t&) noexcept
+{
+    std::free(memory);
+}
 #if defined(__GNUC__) && !defined(__clang__)
 #pragma GCC diagnostic pop
 #endif
@@ -55,8 +82,7 @@ namespace {
 // <date> <H:MM:SS> [LEVEL] logger - text. The date follows the system locale's short form; a
 // locale whose time picture has a marker (en-US "h:mm:ss tt") keeps it after the forced
 // 24-hour time on Windows, e.g. "19:12:53 PM".
-const char* const kHead =
-    R"(^[0-9]{1,4}[./-][0-9]{1,2}[./-][0-9]{1,4} ([0-9]{1,2}):[0-5][0-9]:[0-5][0-9](?: [AP]M)? )";
+const char* const kHead = R"(^[0-9]{1,4}[./-][0-9]{1,2}[./-][0-9]{1,4} ([0-9]{1,2}):[0-5][0-9]:[0-5][0-9](?: [AP]M)? )";
 
 std::string tempPath(const std::string& name)
 {
@@ -101,7 +127,8 @@ TEST_F(CLogTest, LineCarriesDateTimeLevelLoggerAndPieces)
     std::vector<std::string> lines = m_cCapture.lines();
     ASSERT_EQ(1u, lines.size());
     std::smatch match;
-    std::regex line(std::string(kHead) + R"(\[WARN \] CTestLogger - LbCore::CTest::op - value 42 7 18446744073709551615$)");
+    std::regex line(std::string(kHead) +
+                    R"(\[WARN \] CTestLogger - LbCore::CTest::op - value 42 7 18446744073709551615$)");
     ASSERT_TRUE(std::regex_search(lines[0], match, line)) << lines[0];
     int hour = std::stoi(match[1].str()); // a 24-hour clock: the hour is the local tm_hour
     EXPECT_TRUE(hour == before || hour == after) << lines[0];
@@ -198,8 +225,10 @@ TEST_F(CLogTest, FileAppenderAppendsToExistingContent)
     std::vector<std::string> lines = readLines(path);
     ASSERT_EQ(3u, lines.size());
     EXPECT_EQ("line of an earlier run", lines[0]);
-    EXPECT_TRUE(std::regex_search(lines[1], std::regex(std::string(kHead) + R"(\[INFO \] CTestLogger - first$)"))) << lines[1];
-    EXPECT_TRUE(std::regex_search(lines[2], std::regex(std::string(kHead) + R"(\[INFO \] CTestLogger - second$)"))) << lines[2];
+    EXPECT_TRUE(std::regex_search(lines[1], std::regex(std::string(kHead) + R"(\[INFO \] CTestLogger - first$)")))
+        << lines[1];
+    EXPECT_TRUE(std::regex_search(lines[2], std::regex(std::string(kHead) + R"(\[INFO \] CTestLogger - second$)")))
+        << lines[2];
     std::remove(path.c_str());
 }
 
@@ -235,7 +264,8 @@ TEST_F(CLogTest, TwoThreadsWriteWholeLines)
     }
     std::vector<std::string> lines = readLines(path);
     ASSERT_EQ(2u * kLines, lines.size());
-    std::regex whole(std::string(kHead) + R"(\[INFO \] (CWriter[AB]) - LbCore::CTest::write - line [0-9]+ of (CWriter[AB])$)");
+    std::regex whole(std::string(kHead) +
+                     R"(\[INFO \] (CWriter[AB]) - LbCore::CTest::write - line [0-9]+ of (CWriter[AB])$)");
     for (const std::string& line : lines) {
         std::smatch match;
         ASSERT_TRUE(std::regex_search(line, match, whole)) << line;
@@ -247,12 +277,13 @@ TEST_F(CLogTest, TwoThreadsWriteWholeLines)
 TEST_F(CLogTest, ControlCharactersAreWrittenEscapedOnOneLine)
 {
     const std::string forged("FUNC POWER\n01/01/99 00:00:00 [ERROR] forged");
-    m_cLogger.info() << "cmd " << forged << " | " << std::string("a\0b", 3) << '\r' << "\t\x1b\x7f\\x" << -5
-                     << " | " << std::runtime_error("two\nlines");
+    m_cLogger.info() << "cmd " << forged << " | " << std::string("a\0b", 3) << '\r' << "\t\x1b\x7f\\x" << -5 << " | "
+                     << std::runtime_error("two\nlines");
     std::vector<std::string> lines = m_cCapture.lines();
     ASSERT_EQ(1u, lines.size());
-    const std::string tail = "CTestLogger - cmd FUNC POWER\\n01/01/99 00:00:00 [ERROR] forged | a\\x00b\\r\\t\\x1b\\x7f\\x-5"
-                             " | two\\nlines";
+    const std::string tail =
+        "CTestLogger - cmd FUNC POWER\\n01/01/99 00:00:00 [ERROR] forged | a\\x00b\\r\\t\\x1b\\x7f\\x-5"
+        " | two\\nlines";
     ASSERT_GE(lines[0].size(), tail.size());
     EXPECT_EQ(tail, lines[0].substr(lines[0].size() - tail.size()));
 }
@@ -298,7 +329,8 @@ TEST_F(CLogTest, OutputIsTheSameAtEveryLevelWithAndWithoutAFile)
     const std::string tails[] = {"[DEBUG] CTestLogger - LbCore::CTest::op - d 1 session 0x0003::100000",
                                  "[INFO ] CTestLogger - LbCore::CTest::op - i 2",
                                  "[WARN ] CTestLogger - LbCore::CTest::op - w 18446744073709551615",
-                                 "[ERROR] CTestLogger - LbCore::CTest::op - e", "[FATAL] CTestLogger - LbCore::CTest::op - f"};
+                                 "[ERROR] CTestLogger - LbCore::CTest::op - e",
+                                 "[FATAL] CTestLogger - LbCore::CTest::op - f"};
     const std::string path = tempPath("levels.log");
     for (int level = LEVEL_DEBUG; level <= LEVEL_FATAL; ++level) {
         CLogManager::setLevel(level);

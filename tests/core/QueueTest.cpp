@@ -15,7 +15,7 @@ namespace {
 const unsigned kInfinite = CSemaphore::INFINITE_WAIT;
 
 struct CItem {
-    explicit CItem(int value, std::atomic<int>* deletions = nullptr) : m_nValue(value), m_pnDeletions(deletions) {}
+    explicit CItem(int value, std::atomic<int>* deletions = nullptr) : m_nValue(value), m_pnDeletions(deletions) { }
     virtual ~CItem()
     {
         if (m_pnDeletions != nullptr) {

@@ -14,8 +14,8 @@ namespace {
 
 class CObserver {
 public:
-    CObserver(std::vector<int>& calls, int id, bool answer = false) : m_rcCalls(calls), m_nId(id), m_bAnswer(answer) {}
-    virtual ~CObserver() {}
+    CObserver(std::vector<int>& calls, int id, bool answer = false) : m_rcCalls(calls), m_nId(id), m_bAnswer(answer) { }
+    virtual ~CObserver() { }
     virtual bool seen(int value)
     {
         m_rcCalls.push_back(m_nId * 100 + value);

@@ -10,7 +10,6 @@
 #include <string>
 #include <vector>
 
-
 namespace LbTests {
 
 // Generous: a latch that is not opened within this time means the code under test hangs.
@@ -26,8 +25,7 @@ public:
     }
     bool waitOpen() { return waitOpenFor(kDeadline); }
     // For checks that something has NOT happened yet: a short, bounded look.
-    template <class Duration>
-    bool waitOpenFor(Duration wait)
+    template <class Duration> bool waitOpenFor(Duration wait)
     {
         std::unique_lock<std::mutex> lock(m_cMutex);
         return m_cCondition.wait_for(lock, wait, [this] { return m_bOpen; });

@@ -23,7 +23,7 @@ namespace {
 const unsigned kInfinite = CSemaphore::INFINITE_WAIT;
 
 struct CMessage {
-    virtual ~CMessage() {}
+    virtual ~CMessage() { }
 };
 
 // Works like the event dispatcher: run() blocks in pop and ends when the pop is interrupted,
@@ -72,7 +72,7 @@ public:
 // Records the order in which end-of-thread observers are called.
 class CEndObserver : public CThread::CObserver {
 public:
-    CEndObserver(std::vector<int>& calls, std::mutex& mutex, int id) : m_rcCalls(calls), m_rcMutex(mutex), m_nId(id) {}
+    CEndObserver(std::vector<int>& calls, std::mutex& mutex, int id) : m_rcCalls(calls), m_rcMutex(mutex), m_nId(id) { }
     void execute(const CThread& thread) override
     {
         EXPECT_NE(CThread::STATE_IDLE, thread.getState()); // called before the thread turns idle
@@ -184,7 +184,7 @@ TEST_F(CThreadTest, ObserversRunInAttachmentOrderWhenRunEnds)
 
     EXPECT_TRUE(thread.detach(m_cSecond));
     EXPECT_FALSE(thread.detach(m_cSecond));
-    ASSERT_EQ(0, thread.start()); // a thread can be started again after its end
+    ASSERT_EQ(0, thread.start());  // a thread can be started again after its end
     EXPECT_EQ(6, thread.join(30)); // the end of the first run must not satisfy this join
     EXPECT_EQ(0, thread.stopAndJoin(kInfinite));
     EXPECT_EQ((std::vector<int>{2, 1, 1}), calls());
@@ -219,8 +219,11 @@ TEST_F(CThreadTest, WorkerStackIsSmallButRoomy)
 #endif
             return buffer[0] + buffer[sizeof buffer - 1] != 2;
         }
-        bool run() override { return false; }
-        void cleanup() override {}
+        bool run() override
+        {
+            return false;
+        }
+        void cleanup() override { }
         std::size_t m_nStackSize = 0;
     };
     CStackProbe probe;

@@ -43,7 +43,8 @@ std::string askModule(const std::string& name, unsigned parts[4])
     if (module == 0) {
         return "cannot load " + path;
     }
-    TModuleVersion function = reinterpret_cast<TModuleVersion>(reinterpret_cast<void*>(GetProcAddress(module, "lbTestModuleVersion")));
+    TModuleVersion function =
+        reinterpret_cast<TModuleVersion>(reinterpret_cast<void*>(GetProcAddress(module, "lbTestModuleVersion")));
 #else
     void* module = dlopen(path.c_str(), RTLD_NOW | RTLD_LOCAL);
     if (module == nullptr) {
@@ -89,7 +90,9 @@ TEST(Version, StampedModuleReadsBackItsNumbersAndStrings)
     EXPECT_EQ(4, version.getFileMinor());
     EXPECT_EQ(5, version.getFileBuild());
     EXPECT_EQ(6, version.getFileRevision());
-    EXPECT_EQ("3.4.5.6", dotted(version.getProductMajor(), version.getProductMinor(), version.getProductBuild(), version.getProductRevision()));
+    EXPECT_EQ("3.4.5.6",
+              dotted(version.getProductMajor(), version.getProductMinor(), version.getProductBuild(),
+                     version.getProductRevision()));
 
     EXPECT_EQ("Marlowe&Tenby", version.getCompanyName());
     EXPECT_EQ("3.4.5.6", version.getFileVersion());
@@ -105,7 +108,8 @@ TEST(Version, MissingKeysAndMissingVersionInformationGiveTheirTexts)
 {
     const CVersion version(besideExecutable(LB_TEST_STAMPED_MODULE));
     const std::string missing = "CVersion::getQueryValue() can't get the value for the key:";
-    for (const std::string& key : {std::string("NoSuchKey"), std::string(""), std::string(300, 'K'), std::string("Company"), std::string("CompanyName\\")}) {
+    for (const std::string& key : {std::string("NoSuchKey"), std::string(""), std::string(300, 'K'),
+                                   std::string("Company"), std::string("CompanyName\\")}) {
         try {
             version.getQueryValue(key);
             ADD_FAILURE() << "found key '" << key << "'";
@@ -122,7 +126,8 @@ TEST(Version, MissingKeysAndMissingVersionInformationGiveTheirTexts)
 
     const std::string text = besideExecutable("version_tests_plain.txt");
     std::ofstream(text.c_str()) << "no version information here\n";
-    for (const std::string& path : {besideExecutable(LB_TEST_PLAIN_MODULE), text, besideExecutable("no_such_file.dll"), std::string()}) {
+    for (const std::string& path :
+         {besideExecutable(LB_TEST_PLAIN_MODULE), text, besideExecutable("no_such_file.dll"), std::string()}) {
         EXPECT_EQ("VersionInfo: can not retrieve version information", versionError(path)) << path;
     }
     std::remove(text.c_str());
@@ -131,7 +136,8 @@ TEST(Version, MissingKeysAndMissingVersionInformationGiveTheirTexts)
 TEST(Version, EachModuleFindsItsOwnVersion)
 {
     const CVersion& own = CVersion::getModuleVersion();
-    EXPECT_EQ(LB_TEST_PROJECT_VERSION, dotted(own.getFileMajor(), own.getFileMinor(), own.getFileBuild(), own.getFileRevision()));
+    EXPECT_EQ(LB_TEST_PROJECT_VERSION,
+              dotted(own.getFileMajor(), own.getFileMinor(), own.getFileBuild(), own.getFileRevision()));
     EXPECT_EQ(LB_TEST_PROJECT_VERSION, own.getFileVersion());
     EXPECT_EQ(&own, &CVersion::getModuleVersion());
 

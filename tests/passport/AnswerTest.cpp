@@ -176,7 +176,7 @@ TEST_F(Answers, RefusedCommandsFailAtOnceUnderContention)
     EXPECT_EQ(purged, logCount("Asynchronous Message detected!"));
 }
 
-class Recovery : public Answers {};
+class Recovery : public Answers { };
 
 TEST_F(Recovery, AnUnrelatedHotPlugKeepsAPendingResult)
 {

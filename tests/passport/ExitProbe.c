@@ -63,17 +63,17 @@ int main(int argc, char** argv)
     pfWrite = (TWrite)symbol(library, "viWrite");
     pfRead = (TRead)symbol(library, "viRead");
     s_pfClose = (TClose)symbol(library, "viClose");
-    if (pfOpenDefaultRM == NULL || pfOpen == NULL || pfWrite == NULL || pfRead == NULL || s_pfClose == NULL
-        || pfOpenDefaultRM(&s_nRm) != VI_SUCCESS) {
+    if (pfOpenDefaultRM == NULL || pfOpen == NULL || pfWrite == NULL || pfRead == NULL || s_pfClose == NULL ||
+        pfOpenDefaultRM(&s_nRm) != VI_SUCCESS) {
         return 3;
     }
     for (i = 0; i < 2; ++i) {
         ViSession session = VI_NULL;
         ViByte answer[256];
         ViUInt32 count = 0;
-        if (pfOpen(s_nRm, RESOURCES[i], VI_NULL, 0, &session) != VI_SUCCESS
-            || pfWrite(session, (ViConstBuf) "INIT:CONT ON", 12, VI_NULL) != VI_SUCCESS
-            || pfWrite(session, (ViConstBuf) "FETCh?", 6, VI_NULL) != VI_SUCCESS) {
+        if (pfOpen(s_nRm, RESOURCES[i], VI_NULL, 0, &session) != VI_SUCCESS ||
+            pfWrite(session, (ViConstBuf) "INIT:CONT ON", 12, VI_NULL) != VI_SUCCESS ||
+            pfWrite(session, (ViConstBuf) "FETCh?", 6, VI_NULL) != VI_SUCCESS) {
             return 4;
         }
         /* Waits for the first result (at most the session's time-out). */

@@ -13,8 +13,7 @@ namespace {
 std::atomic<int> s_nFailRecord(0);
 std::atomic<ViStatus> s_nFailInstall(VI_SUCCESS);
 
-template <class F>
-F nextService(const char* name)
+template <class F> F nextService(const char* name)
 {
     return reinterpret_cast<F>(dlsym(RTLD_NEXT, name));
 }
@@ -27,7 +26,7 @@ extern "C" __attribute__((visibility("default"))) ViAddr* viSvc57(ViSession vi)
 }
 
 extern "C" __attribute__((visibility("default"))) ViStatus viSvc56(ViSession vi, ViAddr table, ViUInt32 reserved,
-                                                                    ViSession target, ViUInt32 reserved2)
+                                                                   ViSession target, ViUInt32 reserved2)
 {
     static auto s_pfNext = nextService<ViStatus (*)(ViSession, ViAddr, ViUInt32, ViSession, ViUInt32)>("viSvc56");
     ViStatus status = s_nFailInstall.exchange(VI_SUCCESS);
@@ -124,7 +123,8 @@ TEST_F(Lifecycle, AFailedOpenLeavesNoSensorSessionBehind)
     s_nFailRecord = 1;
     EXPECT_EQ(VI_ERROR_SYSTEM_ERROR, viOpen(m_nRm, kFirst, VI_NULL, 0, &session));
     EXPECT_FALSE(driverOpen());
-    EXPECT_TRUE(logContains("[ERROR] CLbPmxInstrSesn - LbPmxPassport::CLbPmxInstrSesn::viOpen - No session record for session "));
+    EXPECT_TRUE(logContains(
+        "[ERROR] CLbPmxInstrSesn - LbPmxPassport::CLbPmxInstrSesn::viOpen - No session record for session "));
 }
 #endif
 
@@ -151,7 +151,8 @@ TEST_F(Lifecycle, ProcessesEndCleanlyWithSessionsOpen)
     setConfiguration("LOG_LEVEL", nullptr);
     setConfiguration("LOG_FILE", nullptr);
     // The detach closed the sessions before it detached the adapter.
-    EXPECT_EQ(std::string::npos, readFile(log).find("Commands interface will be detached, when still some sessions are open. "));
+    EXPECT_EQ(std::string::npos,
+              readFile(log).find("Commands interface will be detached, when still some sessions are open. "));
     EXPECT_NE(std::string::npos, readFile(log).find("Session closed successfully"));
     std::remove(log.c_str());
 }

@@ -6,7 +6,7 @@
 
 namespace LbPassportTest {
 
-class LogLines : public CPassportTest {};
+class LogLines : public CPassportTest { };
 
 TEST_F(LogLines, ACommandCannotForgeALineOrMakeTheLogBinary)
 {

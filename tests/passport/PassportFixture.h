@@ -33,13 +33,15 @@ inline void setConfiguration(const char* name, const char* value)
 {
 #if defined(_WIN32)
     HKEY key = 0;
-    RegCreateKeyExA(HKEY_LOCAL_MACHINE,
-                    "SOFTWARE\\National Instruments\\NI-VISA for Windows 95/NT\\CurrentVersion\\IoLibraries\\LbViPmx.dll", 0,
-                    0, 0, KEY_SET_VALUE, 0, &key, 0);
+    RegCreateKeyExA(
+        HKEY_LOCAL_MACHINE,
+        "SOFTWARE\\National Instruments\\NI-VISA for Windows 95/NT\\CurrentVersion\\IoLibraries\\LbViPmx.dll", 0, 0, 0,
+        KEY_SET_VALUE, 0, &key, 0);
     if (value == 0) {
         RegDeleteValueA(key, name);
     } else {
-        RegSetValueExA(key, name, 0, REG_SZ, reinterpret_cast<const BYTE*>(value), static_cast<DWORD>(std::strlen(value) + 1));
+        RegSetValueExA(key, name, 0, REG_SZ, reinterpret_cast<const BYTE*>(value),
+                       static_cast<DWORD>(std::strlen(value) + 1));
     }
     RegCloseKey(key);
 #else
@@ -88,8 +90,7 @@ inline bool fileExists(const std::string& path)
 }
 
 // Waits for a condition that another thread of the system makes true, with a generous deadline.
-template <class F>
-bool eventually(F condition, int seconds = 30)
+template <class F> bool eventually(F condition, int seconds = 30)
 {
     auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(seconds);
     while (!condition()) {

@@ -12,7 +12,7 @@ namespace LbPassportTest {
 
 const char* const SENSOR = "LBPMX::0x0003::100000::INSTR";
 
-class Resources : public CPassportTest {};
+class Resources : public CPassportTest { };
 
 TEST_F(Resources, FindListsAttachedSensorsInDeviceOrder)
 {
@@ -62,7 +62,7 @@ TEST_F(Resources, OpeningAnUnattachedSensorFailsAndLogs)
     EXPECT_EQ(VI_SUCCESS, viClose(good));
 }
 
-class Sessions : public CPassportTest {};
+class Sessions : public CPassportTest { };
 
 TEST_F(Sessions, TwoVisaSessionsShareOneSensorSession)
 {
@@ -146,7 +146,8 @@ TEST_F(Sessions, AtMost128SensorSessions)
     }
     ViSession refused = VI_NULL;
     EXPECT_EQ(VI_ERROR_RSRC_NFOUND, viOpen(m_nRm, "LBPMX::3::200128", VI_NULL, 0, &refused));
-    EXPECT_TRUE(logContains("[WARN ] CLbPmxInstrSesn - LbPmxPassport::CLbPmxInstrSesn::viOpen - There are already 127 active devices..."));
+    EXPECT_TRUE(logContains(
+        "[WARN ] CLbPmxInstrSesn - LbPmxPassport::CLbPmxInstrSesn::viOpen - There are already 127 active devices..."));
     // The limit is checked before the sensor session is looked for: with 128 open, even one
     // more VISA session on an open resource is refused.
     EXPECT_EQ(VI_ERROR_RSRC_NFOUND, viOpen(m_nRm, "LBPMX::3::200000", VI_NULL, 0, &refused));
@@ -155,7 +156,7 @@ TEST_F(Sessions, AtMost128SensorSessions)
     EXPECT_EQ(VI_SUCCESS, viClose(now));
 }
 
-class Attributes : public CPassportTest {};
+class Attributes : public CPassportTest { };
 
 TEST_F(Attributes, ReadableWritableAndReadOnly)
 {
@@ -198,7 +199,7 @@ TEST_F(Attributes, ReadableWritableAndReadOnly)
     EXPECT_EQ(VI_ERROR_INV_PARAMETER, viGetAttribute(session, VI_ATTR_TMO_VALUE, nullptr));
 }
 
-class Events : public CPassportTest {};
+class Events : public CPassportTest { };
 
 TEST_F(Events, EnableTwiceDisableTwiceAndUnknownTypes)
 {

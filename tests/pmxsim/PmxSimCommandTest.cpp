@@ -13,12 +13,14 @@ TEST_F(PmxSimTest, MeasurementReportsStatesThenResultOnOneLibraryThreadInOrder)
     int64_t handle = open();
     ASSERT_GT(handle, int64_t(0xFFFFFFFF)) << "handles need all 64 bits";
     ASSERT_EQ(0, PmxSendCommand(handle, "*TRG", 0));
-    ASSERT_TRUE(
-        m_aRecorder.waitFor([&](const SCall& c) { return c.kind == eState && c.value == 0; }));
+    ASSERT_TRUE(m_aRecorder.waitFor([&](const SCall& c) { return c.kind == eState && c.value == 0; }));
 
     std::vector<SCall> calls = m_aRecorder.calls();
-    std::vector<SCall> expected = { { eAccepted, handle, 1, {} }, { eState, handle, 2, {} },
-        { eState, handle, 3, {} }, { eData, handle, 6, {} }, { eState, handle, 0, {} } };
+    std::vector<SCall> expected = {{eAccepted, handle, 1, {}},
+                                   {eState, handle, 2, {}},
+                                   {eState, handle, 3, {}},
+                                   {eData, handle, 6, {}},
+                                   {eState, handle, 0, {}}};
     EXPECT_EQ(expected, calls);
     for (const SCall& call : calls) {
         EXPECT_NE(std::this_thread::get_id(), call.thread);
@@ -45,7 +47,7 @@ TEST_F(PmxSimTest, IdentificationIsATextResultAfterTheAcknowledgement)
     int64_t handle = open("usb::0X0C6F::0154::100001");
     ASSERT_EQ(0, PmxSendCommand(handle, "*idn?\n", 0));
     ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eData; }));
-    std::vector<SCall> expected = { { eAccepted, handle, 1, {} }, { eData, handle, 10, {} } };
+    std::vector<SCall> expected = {{eAccepted, handle, 1, {}}, {eData, handle, 10, {}}};
     EXPECT_EQ(expected, m_aRecorder.calls());
     char text[64];
     EXPECT_EQ(PMXSIM_E_TYPE_MISMATCH, PmxGetFloatResult(handle, nullptr, nullptr, nullptr));
@@ -71,10 +73,9 @@ TEST_F(PmxSimTest, UnknownAndIgnoredCommandsReportErrorsBeforeTheAcknowledgement
     command(handle, "bogus:command");
     command(handle, "init:cont off");
     command(handle, "func sideways");
-    std::vector<SCall> expected
-        = { { eError, handle, PMX_ERR_UNKNOWN_COMMAND, {} }, { eAccepted, handle, 1, {} },
-              { eError, handle, PMX_INFO_COMMAND_IGNORED, {} }, { eAccepted, handle, 2, {} },
-              { eError, handle, PMX_ERR_UNKNOWN_COMMAND, {} }, { eAccepted, handle, 3, {} } };
+    std::vector<SCall> expected = {{eError, handle, PMX_ERR_UNKNOWN_COMMAND, {}},  {eAccepted, handle, 1, {}},
+                                   {eError, handle, PMX_INFO_COMMAND_IGNORED, {}}, {eAccepted, handle, 2, {}},
+                                   {eError, handle, PMX_ERR_UNKNOWN_COMMAND, {}},  {eAccepted, handle, 3, {}}};
     EXPECT_EQ(expected, m_aRecorder.calls());
     int32_t state = -1;
     EXPECT_EQ(0, PmxGetTriggerState(handle, &state));
@@ -84,10 +85,10 @@ TEST_F(PmxSimTest, UnknownAndIgnoredCommandsReportErrorsBeforeTheAcknowledgement
 TEST_F(PmxSimTest, PowerMeterSettingsAnswerTheirQueriesAndRefuseBadParameters)
 {
     int64_t handle = open();
-    const char* const kAnswers[][2] = { { "freq?", "1e+09" }, { "aver?", "0" },
-        { "sens:aver:coun?", "1" }, { "corr:offs?", "0" }, { "unit:pow?", "DBM" },
-        { "func?", "POWER" }, { "trac:poin?", "100" }, { "init:cont?", "0" }, { "*ese?", "0" },
-        { "*opc?", "1" }, { "*tst?", "0" }, { "syst:vers?", "1999.0" } };
+    const char* const kAnswers[][2] = {{"freq?", "1e+09"},    {"aver?", "0"},       {"sens:aver:coun?", "1"},
+                                       {"corr:offs?", "0"},   {"unit:pow?", "DBM"}, {"func?", "POWER"},
+                                       {"trac:poin?", "100"}, {"init:cont?", "0"},  {"*ese?", "0"},
+                                       {"*opc?", "1"},        {"*tst?", "0"},       {"syst:vers?", "1999.0"}};
     for (const auto& pair : kAnswers)
         EXPECT_EQ(pair[1], ask(handle, pair[0]));
     command(handle, "SENSe:FREQuency 2.5 GHz");
@@ -96,9 +97,8 @@ TEST_F(PmxSimTest, PowerMeterSettingsAnswerTheirQueriesAndRefuseBadParameters)
     command(handle, "CORR:OFFS -3.25");
     command(handle, "unit:pow w");
     command(handle, "*ese 36");
-    const char* const kChanged[][2] = { { "sens:freq?", "2.5e+09" }, { "aver:stat?", "1" },
-        { "aver:coun?", "16" }, { "corr:offs?", "-3.25" }, { "unit:pow?", "W" },
-        { "*ese?", "36" } };
+    const char* const kChanged[][2] = {{"sens:freq?", "2.5e+09"}, {"aver:stat?", "1"}, {"aver:coun?", "16"},
+                                       {"corr:offs?", "-3.25"},   {"unit:pow?", "W"},  {"*ese?", "36"}};
     for (const auto& pair : kChanged)
         EXPECT_EQ(pair[1], ask(handle, pair[0]));
     command(handle, "*rst");
@@ -106,9 +106,9 @@ TEST_F(PmxSimTest, PowerMeterSettingsAnswerTheirQueriesAndRefuseBadParameters)
     EXPECT_EQ("36", ask(handle, "*ese?")) << "*RST keeps the status enables";
 
     m_aRecorder.clear();
-    const char* const kBad[] = { "freq 5", "freq 1 thz", "aver:coun 0", "aver maybe",
-        "corr:offs 101", "unit:pow dbw", "*ese 256", "freq? 1", "read", "*idn", "meas:volt?",
-        "trac:poin 1025" };
+    const char* const kBad[] = {"freq 5",        "freq 1 thz",   "aver:coun 0", "aver maybe",
+                                "corr:offs 101", "unit:pow dbw", "*ese 256",    "freq? 1",
+                                "read",          "*idn",         "meas:volt?",  "trac:poin 1025"};
     for (const char* bad : kBad)
         command(handle, bad);
     size_t refused = 0;
@@ -157,11 +157,10 @@ TEST_F(PmxSimTest, TraceFunctionAndContinuousMeasurement)
     ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eData; }, 3));
     // A second start while running is ignored with the benign notice.
     command(handle, "init");
-    ASSERT_TRUE(
-        m_aRecorder.waitFor([](const SCall& c) { return c.value == PMX_INFO_COMMAND_IGNORED; }));
+    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.value == PMX_INFO_COMMAND_IGNORED; }));
     command(handle, "init:cont 0");
-    ASSERT_TRUE(m_aRecorder.waitFor(
-        [&](const SCall& c) { return c.kind == eState && c.value == 0 && c.handle == handle; }));
+    ASSERT_TRUE(
+        m_aRecorder.waitFor([&](const SCall& c) { return c.kind == eState && c.value == 0 && c.handle == handle; }));
 
     int32_t type = -1, count = -1, pending = -1;
     ASSERT_EQ(0, PmxGetData(handle, &type, &count, &pending));

@@ -44,7 +44,7 @@ public:
     void add(EKind kind, int64_t handle, int32_t value)
     {
         std::lock_guard<std::mutex> lock(m_aMutex);
-        m_aCalls.push_back(SCall{ kind, handle, value, std::this_thread::get_id() });
+        m_aCalls.push_back(SCall{kind, handle, value, std::this_thread::get_id()});
         m_aChanged.notify_all();
         if (m_fnHook)
             m_fnHook(kind, handle, value);

@@ -15,14 +15,14 @@ using namespace PmxSimTesting;
 TEST_F(PmxSimTest, EveryDataTypeIsDeliveredWithTheQueuedValues)
 {
     int64_t handle = open();
-    const uint8_t bytes[] = { 0, 1, 2, 255 };
-    const int32_t ints[] = { -7, 8, 1 << 30, 99 };
-    const float floats[] = { 1.5f, -2.25f, 3.0f, 4.0f };
+    const uint8_t bytes[] = {0, 1, 2, 255};
+    const int32_t ints[] = {-7, 8, 1 << 30, 99};
+    const float floats[] = {1.5f, -2.25f, 3.0f, 4.0f};
     for (int32_t type = PMXSIM_TYPE_BINARY; type <= PMXSIM_TYPE_LAST; ++type) {
         SCOPED_TRACE(type);
         bool isBytes = type == PMXSIM_TYPE_BINARY || type == PMXSIM_TYPE_TEXT;
-        bool isInts = (type >= PMXSIM_TYPE_BITFIELD1 && type <= PMXSIM_TYPE_BITFIELD3)
-            || type == PMXSIM_TYPE_LONG_TRIPLE || type == PMXSIM_TYPE_LONG;
+        bool isInts = (type >= PMXSIM_TYPE_BITFIELD1 && type <= PMXSIM_TYPE_BITFIELD3) ||
+            type == PMXSIM_TYPE_LONG_TRIPLE || type == PMXSIM_TYPE_LONG;
         const void* values = isBytes ? static_cast<const void*>(bytes)
             : isInts                 ? static_cast<const void*>(ints)
                                      : static_cast<const void*>(floats);
@@ -30,8 +30,7 @@ TEST_F(PmxSimTest, EveryDataTypeIsDeliveredWithTheQueuedValues)
         if (type == PMXSIM_TYPE_TEXT)
             values = "abc";
         ASSERT_EQ(0, PmxSimQueueResult("100000", type, values, queued));
-        ASSERT_TRUE(m_aRecorder.waitFor(
-            [&](const SCall& c) { return c.kind == eData && c.value == type; }));
+        ASSERT_TRUE(m_aRecorder.waitFor([&](const SCall& c) { return c.kind == eData && c.value == type; }));
 
         int32_t reported = -1, count = -1, pending = -1;
         ASSERT_EQ(0, PmxGetData(handle, &reported, &count, &pending));
@@ -58,7 +57,7 @@ TEST_F(PmxSimTest, EveryDataTypeIsDeliveredWithTheQueuedValues)
             EXPECT_EQ(8, b);
             EXPECT_EQ(1 << 30, c);
         } else if (type == PMXSIM_TYPE_FLOAT_ARRAY || type == PMXSIM_TYPE_AUX_FLOAT_ARRAY) {
-            float a1[4] = {}, a2[4] = { 9, 9, 9, 9 }, a3[4] = { 9, 9, 9, 9 };
+            float a1[4] = {}, a2[4] = {9, 9, 9, 9}, a3[4] = {9, 9, 9, 9};
             int32_t n = 0;
             if (type == PMXSIM_TYPE_FLOAT_ARRAY) {
                 EXPECT_EQ(PMXSIM_E_TYPE_MISMATCH, PmxGetAuxFloatArray(handle, a1, a2, a3, 4, &n));
@@ -91,7 +90,7 @@ TEST_F(PmxSimTest, NullCallbackStopsThatCallbackOnly)
     ASSERT_EQ(0, PmxSetNotifyCallbackCommandAccepted(nullptr, nullptr));
     ASSERT_EQ(0, PmxSendCommand(handle, "*idn?", 0));
     ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eData; }));
-    std::vector<SCall> expected = { { eData, handle, 10, {} } };
+    std::vector<SCall> expected = {{eData, handle, 10, {}}};
     EXPECT_EQ(expected, m_aRecorder.calls());
 }
 
@@ -104,8 +103,11 @@ TEST_F(PmxSimTest, ControlFunctionsFireTheirCallbacks)
     ASSERT_EQ(0, PmxSimAttach("PMX-M33", "200"));
     ASSERT_EQ(0, PmxSimSetDeviceFlag("200", 0));
     ASSERT_TRUE(m_aRecorder.waitCount(5));
-    std::vector<SCall> expected = { { eState, handle, 3, {} }, { eError, handle, 0x1234, {} },
-        { eError, 0, PMX_INFO_COMMAND_IGNORED, {} }, { eDevice, 0, 0, {} }, { eDevice, 0, 0, {} } };
+    std::vector<SCall> expected = {{eState, handle, 3, {}},
+                                   {eError, handle, 0x1234, {}},
+                                   {eError, 0, PMX_INFO_COMMAND_IGNORED, {}},
+                                   {eDevice, 0, 0, {}},
+                                   {eDevice, 0, 0, {}}};
     EXPECT_EQ(expected, m_aRecorder.calls());
     int32_t state = 0;
     ASSERT_EQ(0, PmxGetTriggerState(handle, &state));
@@ -204,8 +206,7 @@ TEST_F(PmxSimTest, OpeningChecksDescriptorDriverAndUse)
     int32_t count = 0;
     EXPECT_EQ(PMXSIM_E_DRIVER_NOT_OPEN, PmxGetDeviceListLength(&count));
     ASSERT_EQ(0, PmxOpenDriver());
-    EXPECT_EQ(PMXSIM_E_INVALID_HANDLE, PmxSendCommand(handle, "*trg", 0))
-        << "closing the driver closes its sensors";
+    EXPECT_EQ(PMXSIM_E_INVALID_HANDLE, PmxSendCommand(handle, "*trg", 0)) << "closing the driver closes its sensors";
 }
 
 TEST_F(PmxSimTest, EveryCodeHasItsText)
@@ -214,11 +215,20 @@ TEST_F(PmxSimTest, EveryCodeHasItsText)
     EXPECT_EQ("Unknown command or invalid parameter", errorText(PMX_ERR_UNKNOWN_COMMAND));
     EXPECT_EQ("Sensor has been detached", errorText(PMXSIM_E_SENSOR_DETACHED));
     EXPECT_EQ("Unknown error code 0x00001234", errorText(0x1234));
-    const int32_t codes[] = { PMX_SUCCESS, PMX_INFO_COMMAND_IGNORED, PMXSIM_E_DRIVER_NOT_OPEN,
-        PMXSIM_E_INVALID_ARGUMENT, PMXSIM_E_INVALID_HANDLE, PMXSIM_E_BAD_DESCRIPTOR,
-        PMXSIM_E_NO_SUCH_SENSOR, PMXSIM_E_SENSOR_IN_USE, PMXSIM_E_INDEX_OUT_OF_RANGE,
-        PMXSIM_E_TYPE_MISMATCH, PMXSIM_E_BUFFER_TOO_SMALL, PMXSIM_E_SENSOR_NOT_OPEN,
-        PMXSIM_E_ALREADY_ATTACHED, PMXSIM_E_OUT_OF_RESOURCES };
+    const int32_t codes[] = {PMX_SUCCESS,
+                             PMX_INFO_COMMAND_IGNORED,
+                             PMXSIM_E_DRIVER_NOT_OPEN,
+                             PMXSIM_E_INVALID_ARGUMENT,
+                             PMXSIM_E_INVALID_HANDLE,
+                             PMXSIM_E_BAD_DESCRIPTOR,
+                             PMXSIM_E_NO_SUCH_SENSOR,
+                             PMXSIM_E_SENSOR_IN_USE,
+                             PMXSIM_E_INDEX_OUT_OF_RANGE,
+                             PMXSIM_E_TYPE_MISMATCH,
+                             PMXSIM_E_BUFFER_TOO_SMALL,
+                             PMXSIM_E_SENSOR_NOT_OPEN,
+                             PMXSIM_E_ALREADY_ATTACHED,
+                             PMXSIM_E_OUT_OF_RESOURCES};
     for (int32_t code : codes)
         EXPECT_EQ(std::string::npos, errorText(code).find("Unknown error")) << std::hex << code;
     char small[5];
@@ -226,8 +236,7 @@ TEST_F(PmxSimTest, EveryCodeHasItsText)
     EXPECT_STREQ("Driv", small);
     EXPECT_EQ(PMXSIM_E_INVALID_ARGUMENT, PmxGetErrorText(0, small, 0));
     ASSERT_EQ(0, PmxCloseDriver());
-    EXPECT_EQ("Driver not open", errorText(PMXSIM_E_DRIVER_NOT_OPEN))
-        << "texts need no open driver";
+    EXPECT_EQ("Driver not open", errorText(PMXSIM_E_DRIVER_NOT_OPEN)) << "texts need no open driver";
 }
 
 TEST_F(PmxSimTest, AcknowledgementsFollowDelayAndSwitch)
@@ -274,7 +283,7 @@ TEST_F(PmxSimTest, DeviceListComesFromTheEnvironment)
     ASSERT_EQ(0, PmxSimReset());
     EXPECT_EQ("pmxsim: PMXSIM_DEVICES: entry \"broken\" skipped: not type:serial[:flag]\n"
               "pmxsim: PMXSIM_DEVICES: entry \"PMX:42\" skipped: serial number already attached\n",
-        testing::internal::GetCapturedStderr());
+              testing::internal::GetCapturedStderr());
     ASSERT_EQ(0, PmxOpenDriver());
     ASSERT_EQ(0, PmxGetDeviceListLength(&count));
     ASSERT_EQ(2, count) << "malformed and duplicate entries are skipped";
@@ -287,7 +296,7 @@ TEST_F(PmxSimTest, DeviceListComesFromTheEnvironment)
     int64_t handle = 0;
     EXPECT_EQ(PMXSIM_E_NO_SUCH_SENSOR, PmxOpenSensor("USB::0x0c6f::0000::7", &handle));
 
-    std::vector<const char*> empty = { "None" };
+    std::vector<const char*> empty = {"None"};
 #ifndef _WIN32
     empty.push_back(""); // Windows deletes a variable set to nothing
 #endif
@@ -347,7 +356,7 @@ TEST_F(PmxSimTest, ConcurrentUseFromSeveralThreads)
                 float f[3];
                 char text[128];
                 int32_t rc = type == PMXSIM_TYPE_FLOAT ? PmxGetFloatResult(handle, &f[0], &f[1], &f[2])
-                                       : PmxGetStringResult(handle, text, sizeof text);
+                                                       : PmxGetStringResult(handle, text, sizeof text);
                 if (rc != 0 && rc != PMX_ERR_NO_MORE_RESULTS)
                     ++failures;
             }

@@ -89,7 +89,7 @@ TEST_F(ScenarioTest, FileDescribesSensorsMeasurementsAnswersAndFaults)
     EXPECT_EQ(0, flag);
 
     int64_t first = open();
-    EXPECT_EQ((std::vector<float>{ -10.0f, -11.5f, -10.0f }), readings(first, 3));
+    EXPECT_EQ((std::vector<float>{-10.0f, -11.5f, -10.0f}), readings(first, 3));
     int32_t state = 0;
     EXPECT_EQ(0, PmxGetTriggerState(first, &state));
     EXPECT_EQ(-7, PmxGetTriggerState(first, &state)) << "the second call fails";
@@ -105,8 +105,7 @@ TEST_F(ScenarioTest, FileDescribesSensorsMeasurementsAnswersAndFaults)
     float trace[8];
     int32_t count = 0;
     ASSERT_EQ(0, PmxGetFloatArray(second, trace, 8, &count));
-    EXPECT_EQ((std::vector<float>{ -50, -50, -50, -30, -10, -10, -50, -50 }),
-        std::vector<float>(trace, trace + count));
+    EXPECT_EQ((std::vector<float>{-50, -50, -50, -30, -10, -10, -50, -50}), std::vector<float>(trace, trace + count));
     // The second measurement was the last: the third detaches the sensor instead.
     float noisy = measure(second, "meas?");
     EXPECT_NEAR(-30.0f, noisy, 3.0f);
@@ -125,22 +124,24 @@ TEST_F(ScenarioTest, FileDescribesSensorsMeasurementsAnswersAndFaults)
 TEST_F(ScenarioTest, MalformedFileLeavesNoSensorAndNamesLineAndReason)
 {
     const char* const kBad[][2] = {
-        { "sensors: [", "pmxsim_scenario.yaml:1: end of sequence flow not found" },
-        { "sensors:\n  - {type: PMX, serial: 1, colour: red}", ":2: unknown key \"colour\" in a sensor" },
-        { "sensors:\n  - {type: PMX}", ":2: a sensor needs a type and a serial" },
-        { "sensors:\n  - {type: 'A:B', serial: 1}", ":2: the type must be" },
-        { "sensors:\n  - {type: PMX, serial: 1}\n  - {type: PMX, serial: 1}", ":3: serial number 1 appears twice" },
-        { "sensors:\n  - {type: PMX, serial: 1, power: loud}", ":2: power must be a number" },
-        { "sensors:\n  - {type: PMX, serial: 1, power: []}", ":2: the power sequence must hold" },
-        { "sensors:\n  - {type: PMX, serial: 1, power: {noise: 1}}", ":2: power needs a level" },
-        { "sensors:\n  - {type: PMX, serial: 1, power: {level: -1, noise: -1}}", ":2: the power noise must be within" },
-        { "sensors:\n  - type: PMX\n    serial: 1\n    trace: {pulse: {duration: 0}}", ":4: the pulse duration must be within" },
-        { "sensors:\n  - type: PMX\n    serial: 1\n    answers: [{pattern: x}]", ":4: an answer needs a pattern and either" },
-        { "sensors:\n  - {type: PMX, serial: 1, detach_after: 0}", ":2: detach_after must be within 1" },
-        { "delays: {acknowledge: 010x}", ":1: the acknowledgement delay must be a whole number" },
-        { "faults:\n  - {function: PmxFly, code: 1}", ":2: unknown library function \"PmxFly\"" },
-        { "faults:\n  - {function: PmxGetData, code: 0}", ":2: the fault code must not be 0" },
-        { "- just a list", ":1: the scenario must be a mapping" },
+        {"sensors: [", "pmxsim_scenario.yaml:1: end of sequence flow not found"},
+        {"sensors:\n  - {type: PMX, serial: 1, colour: red}", ":2: unknown key \"colour\" in a sensor"},
+        {"sensors:\n  - {type: PMX}", ":2: a sensor needs a type and a serial"},
+        {"sensors:\n  - {type: 'A:B', serial: 1}", ":2: the type must be"},
+        {"sensors:\n  - {type: PMX, serial: 1}\n  - {type: PMX, serial: 1}", ":3: serial number 1 appears twice"},
+        {"sensors:\n  - {type: PMX, serial: 1, power: loud}", ":2: power must be a number"},
+        {"sensors:\n  - {type: PMX, serial: 1, power: []}", ":2: the power sequence must hold"},
+        {"sensors:\n  - {type: PMX, serial: 1, power: {noise: 1}}", ":2: power needs a level"},
+        {"sensors:\n  - {type: PMX, serial: 1, power: {level: -1, noise: -1}}", ":2: the power noise must be within"},
+        {"sensors:\n  - type: PMX\n    serial: 1\n    trace: {pulse: {duration: 0}}",
+         ":4: the pulse duration must be within"},
+        {"sensors:\n  - type: PMX\n    serial: 1\n    answers: [{pattern: x}]",
+         ":4: an answer needs a pattern and either"},
+        {"sensors:\n  - {type: PMX, serial: 1, detach_after: 0}", ":2: detach_after must be within 1"},
+        {"delays: {acknowledge: 010x}", ":1: the acknowledgement delay must be a whole number"},
+        {"faults:\n  - {function: PmxFly, code: 1}", ":2: unknown library function \"PmxFly\""},
+        {"faults:\n  - {function: PmxGetData, code: 0}", ":2: the fault code must not be 0"},
+        {"- just a list", ":1: the scenario must be a mapping"},
     };
     for (const auto& bad : kBad) {
         SCOPED_TRACE(bad[0]);
@@ -166,8 +167,8 @@ TEST_F(ScenarioTest, ThisBuildRefusesScenarioFiles)
 {
     std::string complaint = load("sensors:\n  - {type: PMX-M01, serial: \"100000\"}");
     EXPECT_NE(std::string::npos,
-        complaint.find("pmxsim_scenario.yaml: scenario files are not supported in this build; no "
-                       "sensors attached"))
+              complaint.find("pmxsim_scenario.yaml: scenario files are not supported in this build; no "
+                             "sensors attached"))
         << complaint;
     EXPECT_EQ(0, sensors());
 }

@@ -100,8 +100,8 @@ TEST_F(DataBuffer, CopyToStaysInsideTheCallersBufferAndMovesNothing)
     char* start = m_cStorage.data();
     EXPECT_TRUE(m_pBuffer->copyTo(start + 1, "XY", 2));
     EXPECT_EQ("aXY", written());
-    EXPECT_FALSE(m_pBuffer->copyTo(start, "Z", 1));         // the first byte is out of bounds
-    EXPECT_FALSE(m_pBuffer->copyTo(start + 7, "ZZ", 2));    // would end behind the buffer
+    EXPECT_FALSE(m_pBuffer->copyTo(start, "Z", 1));          // the first byte is out of bounds
+    EXPECT_FALSE(m_pBuffer->copyTo(start + 7, "ZZ", 2));     // would end behind the buffer
     EXPECT_FALSE(m_pBuffer->copyTo(start + 1, "123456", 6)); // more than the room left (5)
     EXPECT_TRUE(m_pBuffer->copyTo(start + 3, "12345", 5));
     EXPECT_EQ(3u, m_nCount);

@@ -50,7 +50,7 @@ private:
 
 class CRecorder : public CIPmxEventListener {
 public:
-    CRecorder(const std::string& name, CJournal& journal) : m_sName(name), m_rJournal(journal) {}
+    CRecorder(const std::string& name, CJournal& journal) : m_sName(name), m_rJournal(journal) { }
 
     void notifyCommandAcceptedEvent(const CPmxEvent& event) override { record("accepted", event); }
     void notifyDataAvailableEvent(const CPmxEvent& event) override { record("data", event); }
@@ -124,7 +124,8 @@ TEST(EventDispatcher, DeliversInQueueOrderToSubscribersInSubscriptionOrder)
     dispatcher.notifyDataAvailableEvent(event(2));
     dispatcher.notifyErrorOccuredEvent(event(3));
     ASSERT_TRUE(journal.waitSize(6));
-    std::vector<std::string> expected = {"A:accepted:1", "B:accepted:1", "A:data:2", "B:data:2", "A:error:3", "B:error:3"};
+    std::vector<std::string> expected = {"A:accepted:1", "B:accepted:1", "A:data:2",
+                                         "B:data:2",     "A:error:3",    "B:error:3"};
     EXPECT_EQ(expected, journal.entries());
 
     EXPECT_TRUE(dispatcher.removeListener(&first));

@@ -38,7 +38,8 @@ TEST(ScpiCommandParser, RecognisesTheOperationConditionQuery)
 
 TEST(ScpiCommandParser, RecognisesTheFormatCommandsAfterNormalising)
 {
-    expectKinds(CPmxScpiCommandParser::COMMAND_FORMAT_ASCII, {"format ascii", " format  ascii\r\n", "\t\rformat ascii \t"});
+    expectKinds(CPmxScpiCommandParser::COMMAND_FORMAT_ASCII,
+                {"format ascii", " format  ascii\r\n", "\t\rformat ascii \t"});
     expectKinds(CPmxScpiCommandParser::COMMAND_FORMAT_REAL32,
                 {"format real , 32", "format real,32", "format   real  ,  32", "  format   real , 32 \r"});
     expectKinds(CPmxScpiCommandParser::COMMAND_OTHER,
@@ -70,7 +71,7 @@ TEST(ScpiCompare, ComparesHeadersLikeAStringComparison)
     EXPECT_EQ(1, scpiCompare("FETCh?", "fetch"));
     EXPECT_EQ(-1, scpiCompare("FETCh?", "fetch:all?"));
     EXPECT_EQ(1, scpiCompare("FETCh?", ""));
-    EXPECT_EQ(1, scpiCompare("FETCh?", "?"));  // no mnemonic left to match
+    EXPECT_EQ(1, scpiCompare("FETCh?", "?")); // no mnemonic left to match
 
     // A pattern without "?" accepts the input with or without it.
     EXPECT_EQ(0, scpiCompare("FETCh", "fetch"));
@@ -84,7 +85,7 @@ TEST(ScpiCompare, ComparesHeadersLikeAStringComparison)
 
     // Enclosing quotes are dropped before the mnemonics are compared.
     EXPECT_EQ(0, scpiCompare("\"FETCh\"", "fetch"));
-    EXPECT_EQ(1, scpiCompare("FETCh?", "\"fetch?\""));  // ends with the quote, not "?"
+    EXPECT_EQ(1, scpiCompare("FETCh?", "\"fetch?\"")); // ends with the quote, not "?"
 }
 
 TEST(ScpiCompare, HandlesNullPointers)

@@ -34,13 +34,8 @@ const char* const kNames[] = {
 const int R = -1; // refused
 // Successor by current state (rows) and requested target (columns), in the order above.
 const int kTable[7][7] = {
-    {0, 1, 2, 3, R, 5, R},
-    {0, R, 2, R, R, R, R},
-    {0, R, 2, 4, R, 6, R},
-    {0, R, 4, 3, R, R, R},
-    {2, R, R, 4, 4, R, R},
-    {0, R, 6, R, R, 5, R},
-    {2, R, R, R, R, 6, R},
+    {0, 1, 2, 3, R, 5, R}, {0, R, 2, R, R, R, R}, {0, R, 2, 4, R, 6, R}, {0, R, 4, 3, R, R, R},
+    {2, R, R, 4, 4, R, R}, {0, R, 6, R, R, 5, R}, {2, R, R, R, R, 6, R},
 };
 
 class SessionState : public LbTests::CSimSession {
@@ -69,7 +64,8 @@ TEST_F(SessionState, EveryTransitionOfTheTable)
                     from->nextState(session(), to);
                     ADD_FAILURE() << "accepted";
                 } catch (const CIPmxSessionState::CPmxInvalidStateException& e) {
-                    EXPECT_EQ(std::string("Can't change state from ") + kNames[current] + " into state " + kNames[target],
+                    EXPECT_EQ(std::string("Can't change state from ") + kNames[current] + " into state " +
+                                  kNames[target],
                               e.what());
                 }
             } else {

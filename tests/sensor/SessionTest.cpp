@@ -40,11 +40,11 @@ const char* const kSerial = "100000";
 // has heard an event the session has reacted to it.
 class CCounter : public LbPmxVisa::CIPmxEventListener {
 public:
-    void notifyCommandAcceptedEvent(const CPmxEvent&) override {}
+    void notifyCommandAcceptedEvent(const CPmxEvent&) override { }
     void notifyDataAvailableEvent(const CPmxEvent&) override { bump(m_nData); }
     void notifyErrorOccuredEvent(const CPmxEvent&) override { bump(m_nErrors); }
-    void notifyStateChangedEvent(const CPmxEvent&) override {}
-    void notifyDeviceChangedEvent(const CPmxEvent&) override {}
+    void notifyStateChangedEvent(const CPmxEvent&) override { }
+    void notifyDeviceChangedEvent(const CPmxEvent&) override { }
 
     bool waitData(int count) { return waitFor(m_nData, count); }
     bool waitErrors(int count) { return waitFor(m_nErrors, count); }
@@ -366,8 +366,9 @@ TEST_F(SessionTest, TwoSpellingsOfOneResourceShareOneSession)
     EXPECT_EQ(first.get(), second.get());
     EXPECT_EQ(1u, dispatcher().getActiveSessionCount());
     EXPECT_EQ(1u, capture.count(" - Open session"));
-    EXPECT_EQ(1u, capture.count("[INFO ] CPmxSessionDispatcher - LbPmxVisa::CPmxSessionDispatcher::getSession - "
-                                "Recycle session for LBPMX::0x0003::100000::INSTR"));
+    EXPECT_EQ(1u,
+              capture.count("[INFO ] CPmxSessionDispatcher - LbPmxVisa::CPmxSessionDispatcher::getSession - "
+                            "Recycle session for LBPMX::0x0003::100000::INSTR"));
     EXPECT_EQ(1u, capture.count("Session opened successfully: [Id: "));
 
     first.reset();
@@ -418,8 +419,9 @@ TEST_F(SessionTest, EnumerationSkipsUnknownTypesAndClearedFlags)
     EXPECT_EQ(1u, capture.count("Found 3 device(s)..."));
     EXPECT_EQ(1u, capture.count("Adding device PMX-M10;100001"));
     EXPECT_EQ(1u, capture.count("Adding device NO-SUCH-TYPE;200000"));
-    EXPECT_EQ(1u, capture.count("[ERROR] CPmxSessionDispatcher - LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices - "
-                                "Exception during adding to the resource info: "));
+    EXPECT_EQ(1u,
+              capture.count("[ERROR] CPmxSessionDispatcher - LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices - "
+                            "Exception during adding to the resource info: "));
     EXPECT_FALSE(control().isDriverOpen());
 
     // With a session open the enumeration leaves the driver open.
@@ -436,8 +438,9 @@ TEST_F(SessionTest, EventsForUnknownHandlesAreLoggedAndDropped)
     ASSERT_TRUE(capture.waitFor("Could not find a event listener for session 0"));
     CPmxEvent stray = {12345, 6};
     dispatcher().notifyDataAvailableEvent(stray);
-    EXPECT_EQ(1u, capture.count("[ERROR] CPmxSessionDispatcher - LbPmxVisa::CPmxSessionDispatcher::findAndNotify - "
-                                "Could not find a event listener for session 12345"));
+    EXPECT_EQ(1u,
+              capture.count("[ERROR] CPmxSessionDispatcher - LbPmxVisa::CPmxSessionDispatcher::findAndNotify - "
+                            "Could not find a event listener for session 12345"));
     EXPECT_EQ(m_pSession->getState(), CIPmxSessionState::noData());
 }
 

@@ -28,7 +28,7 @@ const char* const kSerial = "100000";
 
 class CDataListener : public LbPmxVisa::CIPmxEventListener {
 public:
-    void notifyCommandAcceptedEvent(const LbPmxVisa::CPmxEvent&) override {}
+    void notifyCommandAcceptedEvent(const LbPmxVisa::CPmxEvent&) override { }
     void notifyDataAvailableEvent(const LbPmxVisa::CPmxEvent&) override
     {
         std::lock_guard<std::mutex> lock(m_cMutex);
@@ -41,8 +41,8 @@ public:
         ++m_nErrors;
         m_cCondition.notify_all();
     }
-    void notifyStateChangedEvent(const LbPmxVisa::CPmxEvent&) override {}
-    void notifyDeviceChangedEvent(const LbPmxVisa::CPmxEvent&) override {}
+    void notifyStateChangedEvent(const LbPmxVisa::CPmxEvent&) override { }
+    void notifyDeviceChangedEvent(const LbPmxVisa::CPmxEvent&) override { }
 
     // True once `count` data notifications have been delivered (generous deadline).
     bool waitData(int count) { return waitFor(m_nData, count); }

@@ -47,8 +47,7 @@ std::string trim(const std::string& s)
 }
 
 // Applies one setting by its key (the long option without dashes).
-bool applySetting(const std::string& key, const std::string& value, bool hasValue, CLanConfig& c,
-                  std::string& error)
+bool applySetting(const std::string& key, const std::string& value, bool hasValue, CLanConfig& c, std::string& error)
 {
     bool ok = true;
     if (key == "no-vxi11" || key == "no-register" || key == "list") {
@@ -63,7 +62,8 @@ bool applySetting(const std::string& key, const std::string& value, bool hasValu
     if (key == "bind") {
         std::uint32_t a;
         ok = parseIpv4(value, a);
-        if (ok) c.m_strBind = value;
+        if (ok)
+            c.m_strBind = value;
     } else if (key == "allow") {
         ok = c.m_cAllow.add(value);
     } else if (key == "max-links") {
@@ -72,7 +72,8 @@ bool applySetting(const std::string& key, const std::string& value, bool hasValu
         ok = parseUnsigned(value, 7 * 24 * 3600, c.m_nIdleSeconds);
     } else if (key == "log") {
         ok = !value.empty();
-        if (ok) c.m_strLog = value;
+        if (ok)
+            c.m_strLog = value;
     } else if (key == "socket-port") {
         ok = parseUnsigned(value, 65000, c.m_nSocketPort) && c.m_nSocketPort > 0;
     } else if (key == "vxi11-port") {
@@ -110,7 +111,8 @@ bool CAllowList::add(const std::string& text)
 {
     std::string list = text;
     for (char& ch : list) {
-        if (ch == ',') ch = ' ';
+        if (ch == ',')
+            ch = ' ';
     }
     std::istringstream words(list);
     std::string word;

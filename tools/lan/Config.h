@@ -36,8 +36,8 @@ struct CLanConfig {
     unsigned m_nSocketPort = 5025;   // raw socket of sensor N listens on this + N
     unsigned m_nVxi11Port = 0;       // core channel; 0 = any free port, announced by rpcbind
     bool m_bVxi11 = true;
-    bool m_bRegister = true;         // register the core channel with the local rpcbind
-    bool m_bList = false;            // print the device names and serials, then exit
+    bool m_bRegister = true; // register the core channel with the local rpcbind
+    bool m_bList = false;    // print the device names and serials, then exit
 };
 
 // Parses argv (and the file named by --config). False with a message in `error` on a bad

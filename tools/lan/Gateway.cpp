@@ -34,7 +34,8 @@ unsigned long remainingMs(Clock::time_point deadline)
 
 std::string lower(std::string s)
 {
-    for (char& c : s) c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
+    for (char& c : s)
+        c = static_cast<char>(std::tolower(static_cast<unsigned char>(c)));
     return s;
 }
 
@@ -51,15 +52,22 @@ std::uint64_t s_nReleases = 0;
 
 long vxi11ErrorOf(ViStatus status)
 {
-    if (status >= VI_SUCCESS) return VXI11_OK;
+    if (status >= VI_SUCCESS)
+        return VXI11_OK;
     switch (status) {
-    case VI_ERROR_TMO: return VXI11_IO_TIMEOUT;
-    case VI_ERROR_RSRC_LOCKED: return VXI11_LOCKED;
+    case VI_ERROR_TMO:
+        return VXI11_IO_TIMEOUT;
+    case VI_ERROR_RSRC_LOCKED:
+        return VXI11_LOCKED;
     case VI_ERROR_INV_PARAMETER:
-    case VI_ERROR_INV_LOCK_TYPE: return VXI11_PARAMETER;
-    case VI_ERROR_NSUP_OPER: return VXI11_NOT_SUPPORTED;
-    case VI_ERROR_ALLOC: return VXI11_OUT_OF_RESOURCES;
-    default: return VXI11_IO_ERROR;
+    case VI_ERROR_INV_LOCK_TYPE:
+        return VXI11_PARAMETER;
+    case VI_ERROR_NSUP_OPER:
+        return VXI11_NOT_SUPPORTED;
+    case VI_ERROR_ALLOC:
+        return VXI11_OUT_OF_RESOURCES;
+    default:
+        return VXI11_IO_ERROR;
     }
 }
 
@@ -83,9 +91,11 @@ CLink::~CLink()
 ViStatus CLink::setTimeout(unsigned long ms)
 {
     ms = std::min(ms, LONGEST_WAIT_MS);
-    if (ms == m_nTimeout) return VI_SUCCESS;
+    if (ms == m_nTimeout)
+        return VI_SUCCESS;
     ViStatus status = viSetAttribute(m_nSession, VI_ATTR_TMO_VALUE, ms);
-    if (status >= VI_SUCCESS) m_nTimeout = ms;
+    if (status >= VI_SUCCESS)
+        m_nTimeout = ms;
     return status;
 }
 
@@ -120,15 +130,15 @@ ViStatus CLink::exclusive(unsigned long ioTimeout, unsigned long lockTimeout, bo
     }
 }
 
-long CLink::write(const char* data, std::size_t size, unsigned long ioTimeout, unsigned long lockTimeout,
-                  bool waitLock, unsigned long& written)
+long CLink::write(const char* data, std::size_t size, unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock,
+                  unsigned long& written)
 {
     ViUInt32 count = 0;
     ViStatus status = exclusive(ioTimeout, lockTimeout, waitLock, [&] {
         ViStatus s = setTimeout(ioTimeout);
-        return s < VI_SUCCESS ? s
-                              : viWrite(m_nSession, reinterpret_cast<ViConstBuf>(data), static_cast<ViUInt32>(size),
-                                        &count);
+        return s < VI_SUCCESS
+            ? s
+            : viWrite(m_nSession, reinterpret_cast<ViConstBuf>(data), static_cast<ViUInt32>(size), &count);
     });
     written = count;
     return vxi11ErrorOf(status);
@@ -221,9 +231,9 @@ long CLink::lock(unsigned long lockTimeout, bool waitLock)
     if (m_bLocked) {
         return VXI11_OK; // one level per link, as VXI-11 knows no nesting
     }
-    ViStatus status = viLock(m_nSession, VI_EXCLUSIVE_LOCK,
-                             static_cast<ViUInt32>(waitLock ? std::min(lockTimeout, LONGEST_WAIT_MS) : 0), VI_NULL,
-                             VI_NULL);
+    ViStatus status =
+        viLock(m_nSession, VI_EXCLUSIVE_LOCK,
+               static_cast<ViUInt32>(waitLock ? std::min(lockTimeout, LONGEST_WAIT_MS) : 0), VI_NULL, VI_NULL);
     if (status == VI_ERROR_TMO || status == VI_ERROR_RSRC_LOCKED) {
         return VXI11_LOCKED;
     }
@@ -250,9 +260,11 @@ ViStatus _VI_FUNCH CLink::onServiceRequest(ViSession, ViEventType, ViEvent, ViAd
     {
         std::lock_guard<std::mutex> guard(s_cSrqMutex);
         auto it = s_mapSrq.find(reinterpret_cast<std::uintptr_t>(user));
-        if (it != s_mapSrq.end()) srq = it->second;
+        if (it != s_mapSrq.end())
+            srq = it->second;
     }
-    if (srq) srq();
+    if (srq)
+        srq();
     return VI_SUCCESS;
 }
 
@@ -274,7 +286,8 @@ long CLink::enableSrq(bool enable, std::function<void()> srq)
         id = s_nNextSrq++;
         s_mapSrq[id] = srq;
     }
-    ViStatus status = viInstallHandler(m_nSession, VI_EVENT_SERVICE_REQ, onServiceRequest, reinterpret_cast<ViAddr>(id));
+    ViStatus status =
+        viInstallHandler(m_nSession, VI_EVENT_SERVICE_REQ, onServiceRequest, reinterpret_cast<ViAddr>(id));
     if (status >= VI_SUCCESS) {
         status = viEnableEvent(m_nSession, VI_EVENT_SERVICE_REQ, VI_HNDLR, VI_NULL);
         if (status < VI_SUCCESS) {
@@ -292,13 +305,12 @@ long CLink::enableSrq(bool enable, std::function<void()> srq)
 
 // ---- gateway
 
-CGateway::CGateway(CLanLog& log, unsigned maxLinks) : m_cLog(log), m_nMaxLinks(maxLinks)
-{
-}
+CGateway::CGateway(CLanLog& log, unsigned maxLinks) : m_cLog(log), m_nMaxLinks(maxLinks) { }
 
 CGateway::~CGateway()
 {
-    if (m_nRm != VI_NULL) viClose(m_nRm);
+    if (m_nRm != VI_NULL)
+        viClose(m_nRm);
 }
 
 bool CGateway::start()
@@ -321,19 +333,22 @@ std::vector<CSensor> CGateway::scan()
     ViChar name[VI_FIND_BUFLEN];
     if (viFindRsrc(m_nRm, "?*::INSTR", &list, &count, name) >= VI_SUCCESS) {
         for (ViUInt32 i = 0; i < count; ++i) {
-            if (i > 0 && viFindNext(list, name) < VI_SUCCESS) break;
+            if (i > 0 && viFindNext(list, name) < VI_SUCCESS)
+                break;
             std::string resource = name;
             std::string serial;
             {
                 std::lock_guard<std::mutex> guard(m_cMutex);
                 auto it = m_mapSerialOf.find(resource);
-                if (it != m_mapSerialOf.end()) serial = it->second;
+                if (it != m_mapSerialOf.end())
+                    serial = it->second;
             }
             if (serial.empty()) {
                 ViSession vi;
                 ViChar text[256] = "";
                 if (viOpen(m_nRm, name, VI_NULL, OPEN_TIMEOUT_MS, &vi) >= VI_SUCCESS) {
-                    if (viGetAttribute(vi, VI_ATTR_USB_SERIAL_NUM, text) < VI_SUCCESS) text[0] = '\0';
+                    if (viGetAttribute(vi, VI_ATTR_USB_SERIAL_NUM, text) < VI_SUCCESS)
+                        text[0] = '\0';
                     viClose(vi);
                 }
                 // Without a serial number the resource string names the sensor.
@@ -344,12 +359,14 @@ std::vector<CSensor> CGateway::scan()
         viClose(list);
     }
     std::lock_guard<std::mutex> guard(m_cMutex);
-    for (auto& sensor : m_vecSensors) sensor->m_bPresent = false;
+    for (auto& sensor : m_vecSensors)
+        sensor->m_bPresent = false;
     for (auto& entry : found) {
         m_mapSerialOf[entry.first] = entry.second;
         CSensor* sensor = nullptr;
         for (auto& s : m_vecSensors) {
-            if (lower(s->m_strSerial) == lower(entry.second)) sensor = s.get();
+            if (lower(s->m_strSerial) == lower(entry.second))
+                sensor = s.get();
         }
         if (sensor == nullptr) {
             m_vecSensors.emplace_back(new CSensor);
@@ -364,7 +381,8 @@ std::vector<CSensor> CGateway::scan()
         sensor->m_bPresent = true;
     }
     std::vector<CSensor> copy;
-    for (auto& sensor : m_vecSensors) copy.push_back(*sensor);
+    for (auto& sensor : m_vecSensors)
+        copy.push_back(*sensor);
     return copy;
 }
 
@@ -384,7 +402,8 @@ std::unique_ptr<CLink> CGateway::open(const std::string& device, long& error)
     std::string resource;
     CSensor* sensor = nullptr;
     for (int attempt = 0; attempt < 2 && resource.empty(); ++attempt) {
-        if (attempt > 0) scan();
+        if (attempt > 0)
+            scan();
         std::lock_guard<std::mutex> guard(m_cMutex);
         sensor = find(device);
         if (sensor != nullptr && sensor->m_bPresent) {

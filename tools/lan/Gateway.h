@@ -58,8 +58,8 @@ class CLink {
 public:
     CLink(CGateway& gateway, CSensor& sensor, ViSession session);
     ~CLink(); // releases the lock, disables events and closes the VISA session
-    long write(const char* data, std::size_t size, unsigned long ioTimeout, unsigned long lockTimeout,
-               bool waitLock, unsigned long& written);
+    long write(const char* data, std::size_t size, unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock,
+               unsigned long& written);
     // Reads up to `max` bytes; `termChar` >= 0 ends the answer after that byte (the rest is kept
     // for the next read). reason: VXI-11 END / CHR / REQCNT bits. `gone` is asked between slices
     // of a long wait, so a vanished client frees its link early.
@@ -115,7 +115,7 @@ private:
     CLanLog& m_cLog;
     unsigned m_nMaxLinks;
     ViSession m_nRm = VI_NULL;
-    std::mutex m_cMutex; // guards the sensor table, link counts and busy flags
+    std::mutex m_cMutex;                // guards the sensor table, link counts and busy flags
     std::condition_variable m_cChanged; // a sensor's I/O finished or a lock was released
     std::vector<std::unique_ptr<CSensor>> m_vecSensors;
     std::map<std::string, std::string> m_mapSerialOf; // resource string -> serial

@@ -28,7 +28,8 @@ bool isQuery(const std::string& line)
     char quote = 0;
     for (char c : line) {
         if (quote != 0) {
-            if (c == quote) quote = 0;
+            if (c == quote)
+                quote = 0;
         } else if (c == '"' || c == '\'') {
             quote = c;
         } else if (c == '?') {

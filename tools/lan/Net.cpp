@@ -7,7 +7,7 @@ namespace LbPmxLan {
 namespace {
 // A client that takes no data for this long is treated as gone.
 constexpr int SEND_TIMEOUT_SECONDS = 10;
-}
+} // namespace
 
 CConnection::CConnection(TSocket socket, std::uint32_t peer, unsigned idleSeconds)
     : m_nSocket(socket), m_nPeer(peer), m_nIdleMs(idleSeconds == 0 ? -1 : static_cast<int>(idleSeconds) * 1000)
@@ -102,11 +102,13 @@ void CListener::acceptLoop()
         bool retry = false;
         TSocket socket = socketAccept(m_nListener, peer, retry);
         if (m_bStopping) {
-            if (socket != NO_SOCKET) socketClose(socket);
+            if (socket != NO_SOCKET)
+                socketClose(socket);
             return;
         }
         if (socket == NO_SOCKET) {
-            if (retry) continue;
+            if (retry)
+                continue;
             m_cLog.line("%s: accepting connections failed", m_strName.c_str());
             return;
         }

@@ -82,7 +82,6 @@ private:
     std::list<std::unique_ptr<CWorker>> m_lstWorkers;
 };
 
-
 } // namespace LbPmxLan
 
 #endif

@@ -14,7 +14,8 @@ namespace LbPmxLan {
 bool parseIpv4(const std::string& text, std::uint32_t& address)
 {
     in_addr a;
-    if (inet_pton(AF_INET, text.c_str(), &a) != 1) return false;
+    if (inet_pton(AF_INET, text.c_str(), &a) != 1)
+        return false;
     address = ntohl(a.s_addr);
     return true;
 }

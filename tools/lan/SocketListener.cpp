@@ -20,8 +20,9 @@ bool readAnswer(CLink& link, CConnection& connection, std::string& answer)
     std::string chunk;
     long reason = 0;
     do {
-        if (link.read(ANSWER_CHUNK, SOCKET_IO_TIMEOUT_MS, 0, false, -1, [&] { return connection.peerGone(); },
-                      chunk, reason) != VXI11_OK) {
+        if (link.read(
+                ANSWER_CHUNK, SOCKET_IO_TIMEOUT_MS, 0, false, -1, [&] { return connection.peerGone(); }, chunk,
+                reason) != VXI11_OK) {
             return !answer.empty();
         }
         answer += chunk;
@@ -47,7 +48,8 @@ void serveSocket(CGateway& gateway, unsigned index, CConnection& connection, CLa
     for (;;) {
         CLineReader::EResult result;
         while ((result = reader.next(line)) == CLineReader::Line) {
-            if (line.empty()) continue;
+            if (line.empty())
+                continue;
             std::string command = line + "\n";
             unsigned long written = 0;
             long status = link->write(command.data(), command.size(), SOCKET_IO_TIMEOUT_MS, 0, false, written);
@@ -55,7 +57,8 @@ void serveSocket(CGateway& gateway, unsigned index, CConnection& connection, CLa
                 log.line("socket inst%u: \"%s\" failed (error %ld)", index, line.c_str(), status);
             } else if (isQuery(line) && readAnswer(*link, connection, answer)) {
                 answer += '\n';
-                if (!connection.writeAll(answer.data(), answer.size())) return;
+                if (!connection.writeAll(answer.data(), answer.size()))
+                    return;
             }
         }
         if (result == CLineReader::Malformed) {
@@ -65,7 +68,8 @@ void serveSocket(CGateway& gateway, unsigned index, CConnection& connection, CLa
             return;
         }
         std::size_t n = connection.readSome(buffer, sizeof buffer);
-        if (n == 0) break;
+        if (n == 0)
+            break;
         reader.feed(buffer, n);
     }
     log.line("socket inst%u: %s disconnected", index, connection.peerText().c_str());
@@ -89,7 +93,8 @@ bool CSocketListeners::update()
     std::lock_guard<std::mutex> guard(m_cMutex);
     for (const CSensor& sensor : m_cGateway.scan()) {
         unsigned index = sensor.m_nIndex;
-        if (m_mapListeners.count(index)) continue;
+        if (m_mapListeners.count(index))
+            continue;
         std::unique_ptr<CListener> listener(
             new CListener("socket inst" + std::to_string(index), m_cLog, m_cConfig.m_cAllow, m_cConfig.m_nIdleSeconds));
         CGateway& gateway = m_cGateway;
@@ -109,9 +114,9 @@ bool CSocketListeners::update()
 void CSocketListeners::stop()
 {
     std::lock_guard<std::mutex> guard(m_cMutex);
-    for (auto& entry : m_mapListeners) entry.second->stop();
+    for (auto& entry : m_mapListeners)
+        entry.second->stop();
     m_mapListeners.clear();
 }
 
 } // namespace LbPmxLan
-

@@ -37,7 +37,8 @@ TSocket socketListen(const std::string& address, unsigned port, unsigned& boundP
     if (fd < 0 || setsockopt(fd, SOL_SOCKET, SO_REUSEADDR, &one, sizeof one) != 0 ||
         ::bind(fd, reinterpret_cast<sockaddr*>(&a), sizeof a) != 0 || ::listen(fd, 16) != 0) {
         error = std::strerror(errno);
-        if (fd >= 0) ::close(fd);
+        if (fd >= 0)
+            ::close(fd);
         return NO_SOCKET;
     }
     socklen_t len = sizeof a;
@@ -125,7 +126,8 @@ void socketClose(TSocket s)
 TSocket socketConnect(std::uint32_t address, unsigned port, int timeoutMs)
 {
     int fd = ::socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0);
-    if (fd < 0) return NO_SOCKET;
+    if (fd < 0)
+        return NO_SOCKET;
     sockaddr_in a;
     std::memset(&a, 0, sizeof a);
     a.sin_family = AF_INET;
@@ -137,7 +139,8 @@ TSocket socketConnect(std::uint32_t address, unsigned port, int timeoutMs)
         int error = 0;
         socklen_t len = sizeof error;
         rc = (::poll(&p, 1, timeoutMs) == 1 && getsockopt(fd, SOL_SOCKET, SO_ERROR, &error, &len) == 0 && error == 0)
-                 ? 0 : -1;
+            ? 0
+            : -1;
     }
     if (rc != 0) {
         ::close(fd);

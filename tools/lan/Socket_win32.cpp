@@ -37,7 +37,8 @@ TSocket socketListen(const std::string& address, unsigned port, unsigned& boundP
     // No SO_REUSEADDR: on Windows it would let another program take over the port.
     if (s == INVALID_SOCKET || ::bind(s, reinterpret_cast<sockaddr*>(&a), sizeof a) != 0 || ::listen(s, 16) != 0) {
         error = "Winsock error " + std::to_string(WSAGetLastError());
-        if (s != INVALID_SOCKET) closesocket(s);
+        if (s != INVALID_SOCKET)
+            closesocket(s);
         return NO_SOCKET;
     }
     int len = sizeof a;
@@ -104,8 +105,10 @@ bool socketPeerGone(TSocket s)
     p.fd = handleOf(s);
     p.events = POLLRDNORM;
     p.revents = 0;
-    if (WSAPoll(&p, 1, 0) <= 0) return false;
-    if (p.revents & (POLLHUP | POLLERR | POLLNVAL)) return true;
+    if (WSAPoll(&p, 1, 0) <= 0)
+        return false;
+    if (p.revents & (POLLHUP | POLLERR | POLLNVAL))
+        return true;
     char c;
     return ::recv(handleOf(s), &c, 1, MSG_PEEK) == 0; // readable with nothing to read: closed
 }
@@ -123,7 +126,8 @@ void socketClose(TSocket s)
 TSocket socketConnect(std::uint32_t address, unsigned port, int timeoutMs)
 {
     SOCKET s = ::socket(AF_INET, SOCK_STREAM, IPPROTO_TCP);
-    if (s == INVALID_SOCKET) return NO_SOCKET;
+    if (s == INVALID_SOCKET)
+        return NO_SOCKET;
     sockaddr_in a;
     std::memset(&a, 0, sizeof a);
     a.sin_family = AF_INET;

@@ -12,8 +12,7 @@ constexpr std::uint32_t RECORD_LAST_FRAGMENT = 0x80000000u;
 constexpr int MAX_EMPTY_FRAGMENTS = 16;
 
 // XDR routines have various signatures; the library takes them all as xdrproc_t.
-template <class TProc>
-xdrproc_t xdrProc(TProc proc)
+template <class TProc> xdrproc_t xdrProc(TProc proc)
 {
     return reinterpret_cast<xdrproc_t>(reinterpret_cast<void (*)()>(proc));
 }
@@ -77,8 +76,7 @@ bool replyError(std::uint32_t xid, Device_ErrorCode code, std::vector<std::uint8
 // Decodes the arguments, runs `body` and frees what decoding allocated. Undecodable arguments
 // answer GARBAGE_ARGS and end the connection.
 template <class TArgs, class TBody>
-bool withArgs(XDR& x, std::uint32_t xid, bool_t (*decode)(XDR*, TArgs*), std::vector<std::uint8_t>& out,
-              TBody body)
+bool withArgs(XDR& x, std::uint32_t xid, bool_t (*decode)(XDR*, TArgs*), std::vector<std::uint8_t>& out, TBody body)
 {
     TArgs args;
     std::memset(&args, 0, sizeof args);
@@ -105,8 +103,7 @@ bool answer(XDR& x, std::uint32_t xid, bool_t (*decode)(XDR*, TArgs*), bool_t (*
     });
 }
 
-bool dispatchCore(XDR& x, std::uint32_t xid, std::uint32_t proc, CIVxi11Device& device,
-                  std::vector<std::uint8_t>& out)
+bool dispatchCore(XDR& x, std::uint32_t xid, std::uint32_t proc, CIVxi11Device& device, std::vector<std::uint8_t>& out)
 {
     switch (proc) {
     case 0: // NULLPROC: a ping
@@ -136,7 +133,7 @@ bool dispatchCore(XDR& x, std::uint32_t xid, std::uint32_t proc, CIVxi11Device& 
         return withArgs(x, xid, xdr_Device_GenericParms, out, [&](Device_GenericParms& a) {
             const long notSupported = 8;
             long code = proc == device_trigger ? device.trigger(a)
-                        : proc == device_clear ? device.clear(a)
+                : proc == device_clear         ? device.clear(a)
                                                : notSupported; // no remote/local state on USB
             replyError(xid, code, out);
         });
@@ -177,8 +174,8 @@ bool readRpcRecord(const std::function<bool(void*, std::size_t)>& readExact, std
         if (!readExact(raw, sizeof raw)) {
             return false;
         }
-        std::uint32_t header = (std::uint32_t(raw[0]) << 24) | (std::uint32_t(raw[1]) << 16) |
-                               (std::uint32_t(raw[2]) << 8) | raw[3];
+        std::uint32_t header =
+            (std::uint32_t(raw[0]) << 24) | (std::uint32_t(raw[1]) << 16) | (std::uint32_t(raw[2]) << 8) | raw[3];
         std::size_t length = header & ~RECORD_LAST_FRAGMENT;
         if (length > maxRecord - record.size()) {
             return false;

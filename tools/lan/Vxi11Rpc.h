@@ -36,7 +36,7 @@ bool readRpcRecord(const std::function<bool(void*, std::size_t)>& readExact, std
 // back in `data`, which the dispatcher owns.
 class CIVxi11Device {
 public:
-    virtual ~CIVxi11Device() {}
+    virtual ~CIVxi11Device() { }
     virtual void createLink(const Create_LinkParms& parms, Create_LinkResp& resp) = 0;
     virtual long write(const Device_WriteParms& parms, unsigned long& size) = 0;
     virtual long read(const Device_ReadParms& parms, std::string& data, long& reason) = 0;
@@ -58,8 +58,8 @@ enum class EVxi11Channel { Core, Abort };
 // Handles one record. Fills `reply` (a complete record, header included) unless the call needs
 // none; returns false when the input was malformed and the connection must close after the
 // reply (which then reports the error, where the call could be identified).
-bool dispatchVxi11(EVxi11Channel channel, const std::vector<std::uint8_t>& record,
-                   CIVxi11Device& device, std::vector<std::uint8_t>& reply);
+bool dispatchVxi11(EVxi11Channel channel, const std::vector<std::uint8_t>& record, CIVxi11Device& device,
+                   std::vector<std::uint8_t>& reply);
 
 // Encodes a device_intr_srq call (one-way, no reply expected) as a complete record.
 bool encodeSrqCall(std::uint32_t xid, const std::string& handle, std::vector<std::uint8_t>& record);

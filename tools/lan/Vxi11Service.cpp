@@ -41,7 +41,8 @@ public:
     ~CCoreConnection() override
     {
         std::lock_guard<std::mutex> guard(s_cLinksMutex);
-        for (auto& link : m_mapLinks) s_setLinks.erase(link.first);
+        for (auto& link : m_mapLinks)
+            s_setLinks.erase(link.first);
     }
 
     void createLink(const Create_LinkParms& parms, Create_LinkResp& resp) override
@@ -50,10 +51,12 @@ public:
         std::unique_ptr<CLink> link = m_cGateway.open(parms.device ? parms.device : "", error);
         if (link && parms.lockDevice) {
             error = link->lock(parms.lock_timeout, true);
-            if (error != VXI11_OK) link.reset();
+            if (error != VXI11_OK)
+                link.reset();
         }
         resp.error = error;
-        if (!link) return;
+        if (!link)
+            return;
         long lid = s_nNextLink++;
         m_cGateway.log().line("link %ld: %s opened inst%u (%s)", lid, m_cConnection.peerText().c_str(),
                               link->sensor().m_nIndex, link->sensor().m_strSerial.c_str());
@@ -69,18 +72,21 @@ public:
     long write(const Device_WriteParms& p, unsigned long& size) override
     {
         CLink* link = find(p.lid);
-        if (!link) return VXI11_INVALID_LINK;
+        if (!link)
+            return VXI11_INVALID_LINK;
         return link->write(p.data.data_val, p.data.data_len, p.io_timeout, p.lock_timeout,
                            (p.flags & VXI11_FLAG_WAITLOCK) != 0, size);
     }
     long read(const Device_ReadParms& p, std::string& data, long& reason) override
     {
         CLink* link = find(p.lid);
-        if (!link) return VXI11_INVALID_LINK;
+        if (!link)
+            return VXI11_INVALID_LINK;
         int term = (p.flags & VXI11_FLAG_TERMCHRSET) ? static_cast<unsigned char>(p.termChar) : -1;
         std::size_t max = std::min<std::size_t>(p.requestSize, VXI11_MAX_RECV);
-        return link->read(max, p.io_timeout, p.lock_timeout, (p.flags & VXI11_FLAG_WAITLOCK) != 0, term,
-                          [this] { return m_cConnection.peerGone(); }, data, reason);
+        return link->read(
+            max, p.io_timeout, p.lock_timeout, (p.flags & VXI11_FLAG_WAITLOCK) != 0, term,
+            [this] { return m_cConnection.peerGone(); }, data, reason);
     }
     long readStb(const Device_GenericParms& p, unsigned char& stb) override
     {
@@ -113,14 +119,17 @@ public:
     long enableSrq(const Device_EnableSrqParms& p) override
     {
         CLink* link = find(p.lid);
-        if (!link) return VXI11_INVALID_LINK;
-        if (!p.enable) return link->enableSrq(false, nullptr);
+        if (!link)
+            return VXI11_INVALID_LINK;
+        if (!p.enable)
+            return link->enableSrq(false, nullptr);
         std::string handle(p.handle.handle_val, p.handle.handle_len);
         std::shared_ptr<CInterruptChannel> channel = m_pcInterrupt;
         CLanLog& log = m_cGateway.log();
         return link->enableSrq(true, [channel, handle, &log] {
             std::vector<std::uint8_t> call;
-            if (!channel || !encodeSrqCall(s_nNextXid++, handle, call)) return;
+            if (!channel || !encodeSrqCall(s_nNextXid++, handle, call))
+                return;
             TSocket socket = socketConnect(channel->m_nAddress, channel->m_nPort, SRQ_CONNECT_TIMEOUT_MS);
             if (socket == NO_SOCKET) {
                 log.line("service request: interrupt channel unreachable");
@@ -132,7 +141,8 @@ public:
     long destroyLink(Device_Link lid) override
     {
         auto it = m_mapLinks.find(lid);
-        if (it == m_mapLinks.end()) return VXI11_INVALID_LINK;
+        if (it == m_mapLinks.end())
+            return VXI11_INVALID_LINK;
         m_mapLinks.erase(it);
         std::lock_guard<std::mutex> guard(s_cLinksMutex);
         s_setLinks.erase(lid);
@@ -140,7 +150,8 @@ public:
     }
     long createIntrChan(const Device_RemoteFunc& p) override
     {
-        if (m_pcInterrupt) return VXI11_CHANNEL_EXISTS;
+        if (m_pcInterrupt)
+            return VXI11_CHANNEL_EXISTS;
         if (p.progFamily != DEVICE_TCP || p.progNum != DEVICE_INTR || p.progVers != DEVICE_INTR_VERSION) {
             return VXI11_PARAMETER;
         }
@@ -151,7 +162,8 @@ public:
     }
     long destroyIntrChan() override
     {
-        if (!m_pcInterrupt) return VXI11_NO_CHANNEL;
+        if (!m_pcInterrupt)
+            return VXI11_NO_CHANNEL;
         m_pcInterrupt.reset();
         return VXI11_OK;
     }
@@ -203,7 +215,8 @@ void serve(EVxi11Channel channel, CConnection& connection, CIVxi11Device& device
     auto readExact = [&](void* p, std::size_t n) { return connection.readExact(p, n); };
     while (readRpcRecord(readExact, RPC_MAX_RECORD, record)) {
         bool ok = dispatchVxi11(channel, record, device, reply);
-        if (!reply.empty() && !connection.writeAll(reply.data(), reply.size())) return;
+        if (!reply.empty() && !connection.writeAll(reply.data(), reply.size()))
+            return;
         if (!ok) {
             log.line("%s: malformed RPC input, connection closed", connection.peerText().c_str());
             return;
@@ -242,12 +255,12 @@ bool CVxi11Service::start()
         })) {
         return false;
     }
-    m_cLog.line("VXI-11 core channel on %s:%u, abort channel on port %u", m_cConfig.m_strBind.c_str(),
-                m_cCore.port(), abortPort);
+    m_cLog.line("VXI-11 core channel on %s:%u, abort channel on port %u", m_cConfig.m_strBind.c_str(), m_cCore.port(),
+                abortPort);
     if (m_cConfig.m_bRegister) {
         pmap_unset(DEVICE_CORE, DEVICE_CORE_VERSION); // a registration left by a gateway that died
-        m_bRegistered = pmap_set(DEVICE_CORE, DEVICE_CORE_VERSION, IPPROTO_TCP,
-                                 static_cast<unsigned short>(m_cCore.port())) != 0;
+        m_bRegistered =
+            pmap_set(DEVICE_CORE, DEVICE_CORE_VERSION, IPPROTO_TCP, static_cast<unsigned short>(m_cCore.port())) != 0;
         if (!m_bRegistered) {
             m_cLog.line("cannot register with rpcbind; VXI-11 clients will not find the gateway");
             return false;

@@ -44,10 +44,10 @@ void blockStopSignals()
 const char* const STOP_HINT = "serving; stop with Ctrl+C";
 
 // Calls `rescan` every RESCAN_SECONDS until a stop is requested; returns its name.
-template <class TRescan>
-const char* waitForStop(TRescan rescan)
+template <class TRescan> const char* waitForStop(TRescan rescan)
 {
-    while (WaitForSingleObject(s_hStop, RESCAN_SECONDS * 1000) == WAIT_TIMEOUT) rescan();
+    while (WaitForSingleObject(s_hStop, RESCAN_SECONDS * 1000) == WAIT_TIMEOUT)
+        rescan();
     return "stop request";
 }
 #else
@@ -64,12 +64,12 @@ void blockStopSignals()
     signal(SIGPIPE, SIG_IGN);
 }
 
-template <class TRescan>
-const char* waitForStop(TRescan rescan)
+template <class TRescan> const char* waitForStop(TRescan rescan)
 {
     timespec wait = {static_cast<time_t>(RESCAN_SECONDS), 0};
     int signal;
-    while ((signal = sigtimedwait(&s_cStopSignals, nullptr, &wait)) < 0) rescan();
+    while ((signal = sigtimedwait(&s_cStopSignals, nullptr, &wait)) < 0)
+        rescan();
     return signal == SIGTERM ? "SIGTERM" : "SIGINT";
 }
 #endif

@@ -35,13 +35,25 @@ public:
         reason = VXI11_REASON_END;
         return 0;
     }
-    long readStb(const Device_GenericParms&, unsigned char& stb) override { stb = 0x50; return 0; }
+    long readStb(const Device_GenericParms&, unsigned char& stb) override
+    {
+        stb = 0x50;
+        return 0;
+    }
     long trigger(const Device_GenericParms&) override { return 0; }
     long clear(const Device_GenericParms&) override { return 0; }
-    long lock(const Device_LockParms& p) override { m_nLid = p.lid; return 11; }
+    long lock(const Device_LockParms& p) override
+    {
+        m_nLid = p.lid;
+        return 11;
+    }
     long unlock(Device_Link) override { return 12; }
     long enableSrq(const Device_EnableSrqParms&) override { return 0; }
-    long destroyLink(Device_Link lid) override { m_nLid = lid; return 0; }
+    long destroyLink(Device_Link lid) override
+    {
+        m_nLid = lid;
+        return 0;
+    }
     long createIntrChan(const Device_RemoteFunc&) override { return 0; }
     long destroyIntrChan() override { return 6; }
     long abort(Device_Link) override { return 4; }
@@ -129,7 +141,8 @@ TEST(LanVxi11, DispatchesCallsAndEncodesReplies)
 
     // The abort channel serves device_abort only; the core program is unknown there.
     Device_Link lid = 42;
-    ASSERT_TRUE(dispatchVxi11(EVxi11Channel::Abort, call(device_abort, xdr_Device_Link, &lid, DEVICE_ASYNC), device, out));
+    ASSERT_TRUE(
+        dispatchVxi11(EVxi11Channel::Abort, call(device_abort, xdr_Device_Link, &lid, DEVICE_ASYNC), device, out));
     ASSERT_EQ(SUCCESS, reply(out, xdr_Device_Error, &error));
     EXPECT_EQ(4, error.error);
     ASSERT_TRUE(dispatchVxi11(EVxi11Channel::Abort, call(destroy_link, xdr_Device_Link, &lid), device, out));
@@ -157,7 +170,8 @@ TEST(LanVxi11, MalformedInputClosesTheConnection)
     const std::uint8_t stream[] = {0, 0, 0, 2, 'a', 'b', 0x80, 0, 0, 1, 'c', 0x80, 0, 0x10, 0};
     std::size_t at = 0;
     auto readExact = [&](void* p, std::size_t n) {
-        if (at + n > sizeof stream) return false;
+        if (at + n > sizeof stream)
+            return false;
         std::memcpy(p, stream + at, n);
         at += n;
         return true;

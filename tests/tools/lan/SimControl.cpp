@@ -20,7 +20,8 @@ void* control(void*)
 {
     for (;;) {
         std::FILE* in = std::fopen((std::string(s_pFolder) + "/ctl").c_str(), "r");
-        if (in == nullptr) return nullptr;
+        if (in == nullptr)
+            return nullptr;
         char line[256];
         while (std::fgets(line, sizeof line, in) != nullptr) {
             char type[64];
@@ -32,7 +33,8 @@ void* control(void*)
                 rc = PmxSimAttach(type, serial);
             }
             std::FILE* out = std::fopen((std::string(s_pFolder) + "/ack").c_str(), "w");
-            if (out == nullptr) return nullptr;
+            if (out == nullptr)
+                return nullptr;
             std::fprintf(out, "%ld\n", rc);
             std::fclose(out);
         }
@@ -43,7 +45,8 @@ void* control(void*)
 __attribute__((constructor)) void startControl()
 {
     const char* folder = std::getenv("LBPMX_LAN_SIMCTL");
-    if (folder == nullptr) return;
+    if (folder == nullptr)
+        return;
     s_pFolder = folder;
     // The control thread takes no signals: the gateway waits for SIGTERM in its main thread.
     sigset_t all;
@@ -51,7 +54,8 @@ __attribute__((constructor)) void startControl()
     sigfillset(&all);
     pthread_sigmask(SIG_BLOCK, &all, &old);
     pthread_t thread;
-    if (pthread_create(&thread, nullptr, control, nullptr) == 0) pthread_detach(thread);
+    if (pthread_create(&thread, nullptr, control, nullptr) == 0)
+        pthread_detach(thread);
     pthread_sigmask(SIG_SETMASK, &old, nullptr);
 }
 
