@@ -11,7 +11,7 @@ namespace {
 
 const char* const c_szNoVersionInfo = "VersionInfo: can not retrieve version information";
 const char* const c_szNoModuleName = "Can't get module name, please verify your system settings";
-const int c_nFixedWords = 13;
+const int FIXED_WORDS = 13;
 
 // The module's own version, built while the module loads. A module without version
 // information must still load, so a failure is kept and thrown to whoever asks.
@@ -43,7 +43,7 @@ CVersion::CVersion(const std::string& path) : m_pbyFixedInfo(nullptr)
     }
     const void* value = nullptr;
     std::size_t size = 0;
-    if (!queryValue("\\", value, size) || value == nullptr || size < c_nFixedWords * sizeof(std::uint32_t)) {
+    if (!queryValue("\\", value, size) || value == nullptr || size < FIXED_WORDS * sizeof(std::uint32_t)) {
         m_cBlock.clear();
         throw CVersionException(c_szNoVersionInfo);
     }

@@ -18,12 +18,12 @@ namespace LbCore {
 
 namespace {
 
-const char c_szSectionName[] = ".lb_version";
-const char c_szMagic[8] = {'L', 'B', 'V', 'E', 'R', 'S', '1', '\0'};
-const std::size_t c_nFixedOffset = 8;
-const std::size_t c_nFixedSize = 13 * 4;
-const std::size_t c_nTranslationOffset = c_nFixedOffset + c_nFixedSize;
-const std::size_t c_nStringsOffset = c_nTranslationOffset + 4;
+const char SECTION_NAME[] = ".lb_version";
+const char MAGIC[8] = {'L', 'B', 'V', 'E', 'R', 'S', '1', '\0'};
+const std::size_t FIXED_OFFSET = 8;
+const std::size_t FIXED_SIZE = 13 * 4;
+const std::size_t TRANSLATION_OFFSET = FIXED_OFFSET + FIXED_SIZE;
+const std::size_t STRINGS_OFFSET = TRANSLATION_OFFSET + 4;
 const std::uint64_t c_nMaxSection = 1 << 20;
 
 // An address inside this module; dladdr names the module that holds it.
@@ -87,17 +87,17 @@ bool CVersion::readBlock(const std::string& path)
         return false;
     }
     for (const Elf64_Shdr& section : sections) {
-        if (section.sh_name >= names.sh_size || std::strcmp(&nameTable[section.sh_name], c_szSectionName) != 0) {
+        if (section.sh_name >= names.sh_size || std::strcmp(&nameTable[section.sh_name], SECTION_NAME) != 0) {
             continue;
         }
         if (section.sh_type == SHT_NOBITS || section.sh_offset > fileSize ||
-            section.sh_size > fileSize - section.sh_offset || section.sh_size < c_nStringsOffset ||
+            section.sh_size > fileSize - section.sh_offset || section.sh_size < STRINGS_OFFSET ||
             section.sh_size > c_nMaxSection) {
             return false;
         }
         m_cBlock.resize(section.sh_size);
         if (!readAt(file, section.sh_offset, m_cBlock.data(), m_cBlock.size()) ||
-            std::memcmp(m_cBlock.data(), c_szMagic, sizeof(c_szMagic)) != 0) {
+            std::memcmp(m_cBlock.data(), MAGIC, sizeof(MAGIC)) != 0) {
             m_cBlock.clear();
             return false;
         }
@@ -108,16 +108,16 @@ bool CVersion::readBlock(const std::string& path)
 
 bool CVersion::queryValue(const std::string& path, const void*& value, std::size_t& size) const
 {
-    if (m_cBlock.size() < c_nStringsOffset) {
+    if (m_cBlock.size() < STRINGS_OFFSET) {
         return false;
     }
     if (path == "\\") {
-        value = &m_cBlock[c_nFixedOffset];
-        size = c_nFixedSize;
+        value = &m_cBlock[FIXED_OFFSET];
+        size = FIXED_SIZE;
         return true;
     }
     if (equalsIgnoringCase(path.c_str(), "\\VarFileInfo\\Translation")) {
-        value = &m_cBlock[c_nTranslationOffset];
+        value = &m_cBlock[TRANSLATION_OFFSET];
         size = 4;
         return true;
     }
@@ -127,7 +127,7 @@ bool CVersion::queryValue(const std::string& path, const void*& value, std::size
         return false;
     }
     std::uint16_t translation[2];
-    std::memcpy(translation, &m_cBlock[c_nTranslationOffset], sizeof(translation));
+    std::memcpy(translation, &m_cBlock[TRANSLATION_OFFSET], sizeof(translation));
     char expected[9];
     std::snprintf(expected, sizeof(expected), "%04x%04x", static_cast<unsigned>(translation[0]),
                   static_cast<unsigned>(translation[1]));
@@ -136,7 +136,7 @@ bool CVersion::queryValue(const std::string& path, const void*& value, std::size
     }
     const std::string key = path.substr(prefix.size() + 9);
 
-    const char* cursor = reinterpret_cast<const char*>(&m_cBlock[c_nStringsOffset]);
+    const char* cursor = reinterpret_cast<const char*>(&m_cBlock[STRINGS_OFFSET]);
     const char* const end = reinterpret_cast<const char*>(m_cBlock.data() + m_cBlock.size());
     while (cursor < end && *cursor != '\0') {
         const char* const keyEnd = static_cast<const char*>(std::memchr(cursor, '\0', end - cursor));

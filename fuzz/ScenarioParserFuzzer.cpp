@@ -38,7 +38,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
                 PmxSim::matchesPattern(answer.strPattern.c_str(), input.c_str());
         }
         for (const PmxSim::SFault& fault : scenario.faults)
-            check(fault.nFunction >= 0 && fault.nFunction < PmxSim::kFunctionCount && fault.nCall >= 1 &&
+            check(fault.nFunction >= 0 && fault.nFunction < PmxSim::FUNCTION_COUNT && fault.nCall >= 1 &&
                   fault.nCode != 0);
         check(scenario.nAckMs >= 0 && scenario.nMeasureMs >= 0);
     } else {

@@ -28,7 +28,7 @@ struct SEntry {
     double dHigh;
 };
 
-const SEntry kCommands[] = {
+const SEntry COMMANDS[] = {
     {"*IDN", eIdn, eNoParameter, eQueryOnly, 0, 0},
     {"*RST", eReset, eNoParameter, eSetOnly, 0, 0},
     {"*CLS", eClearStatus, eNoParameter, eSetOnly, 0, 0},
@@ -46,10 +46,10 @@ const SEntry kCommands[] = {
     {"MEASure [POWer]", eMeasurePower, eNoParameter, eQueryOnly, 0, 0},
     {"FUNCtion", eFunction, eFunctionChoice, eSetAndQuery, 0, 0},
     {"TRACe POINts", eTracePoints, eInteger, eSetAndQuery, 1, kMaxTracePoints},
-    {"[SENSe] FREQuency", eFrequency, eReal, eSetAndQuery, kMinFrequencyHz, kMaxFrequencyHz},
+    {"[SENSe] FREQuency", eFrequency, eReal, eSetAndQuery, MIN_FREQUENCY_HZ, MAX_FREQUENCY_HZ},
     {"[SENSe] AVERage COUNt", eAverageCount, eInteger, eSetAndQuery, 1, kMaxAverageCount},
     {"[SENSe] AVERage [STATe]", eAveraging, eBoolean, eSetAndQuery, 0, 0},
-    {"[SENSe] CORRection OFFSet", eOffset, eReal, eSetAndQuery, -kMaxOffsetDb, kMaxOffsetDb},
+    {"[SENSe] CORRection OFFSet", eOffset, eReal, eSetAndQuery, -MAX_OFFSET_DB, MAX_OFFSET_DB},
     {"UNIT POWer", eUnit, eUnitChoice, eSetAndQuery, 0, 0},
     {"SYSTem VERSion", eVersion, eNoParameter, eQueryOnly, 0, 0},
 };
@@ -89,7 +89,7 @@ const std::vector<std::vector<SKeyword>>& patterns()
 {
     static const std::vector<std::vector<SKeyword>> all = [] {
         std::vector<std::vector<SKeyword>> made;
-        for (const SEntry& entry : kCommands)
+        for (const SEntry& entry : COMMANDS)
             made.push_back(keywords(entry.pattern));
         return made;
     }();
@@ -202,8 +202,8 @@ SCommand parseCommand(const std::string& text)
         start = colon + 1;
     }
 
-    for (size_t i = 0; i < sizeof kCommands / sizeof kCommands[0]; ++i) {
-        const SEntry& entry = kCommands[i];
+    for (size_t i = 0; i < sizeof COMMANDS / sizeof COMMANDS[0]; ++i) {
+        const SEntry& entry = COMMANDS[i];
         if (!matches(patterns()[i], 0, words, 0))
             continue;
         bool allowed = command.bQuery ? entry.eUse != eSetOnly : entry.eUse != eQueryOnly;

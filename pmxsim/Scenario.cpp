@@ -13,7 +13,7 @@ namespace PmxSim {
 namespace {
 
 const char* const kDefaultDevices = "PMX-M01:100000,PMX-M10:100001";
-const size_t kMaxScenarioBytes = 1 << 20;
+const size_t MAX_SCENARIO_BYTES = 1 << 20;
 
 void complain(const std::string& text)
 {
@@ -29,7 +29,7 @@ bool readFile(const std::string& path, std::string* text)
     std::ostringstream content;
     content << file.rdbuf();
     *text = content.str();
-    return !file.bad() && text->size() <= kMaxScenarioBytes;
+    return !file.bad() && text->size() <= MAX_SCENARIO_BYTES;
 }
 
 SScenario fileScenario(const std::string& path)

@@ -16,8 +16,8 @@ namespace PmxSim {
 namespace {
 
 const int32_t kMaxDelayMs = 60000;
-const size_t kMaxSequence = 100000;
-const size_t kMaxAnswers = 1000;
+const size_t MAX_SEQUENCE = 100000;
+const size_t MAX_ANSWERS = 1000;
 
 // A fault in the file: where and why.
 struct SBad {
@@ -98,7 +98,7 @@ void readPower(const YAML::Node& node, SSensorModel* sensor)
         power.dLevelDbm = real(node, "power", -200, 100);
     } else if (node.IsSequence()) {
         power.eKind = SPowerModel::eSequence;
-        if (node.size() == 0 || node.size() > kMaxSequence)
+        if (node.size() == 0 || node.size() > MAX_SEQUENCE)
             fail(node, "the power sequence must hold 1 to 100000 levels");
         for (const auto& level : node)
             power.levels.push_back(real(level, "a power level", -200, 100));
@@ -144,7 +144,7 @@ void readTrace(const YAML::Node& node, STraceModel* trace)
 
 void readAnswers(const YAML::Node& node, SSensorModel* sensor)
 {
-    if (!node.IsSequence() || node.size() > kMaxAnswers)
+    if (!node.IsSequence() || node.size() > MAX_ANSWERS)
         fail(node, "answers must be a list of at most 1000 entries");
     for (const auto& item : node) {
         expectMap(item, "an answer", {"pattern", "answer", "error"});
@@ -199,7 +199,7 @@ SFault readFault(const YAML::Node& node)
     SFault fault;
     std::string name = text(node["function"], "the function");
     fault.nFunction = -1;
-    for (int fn = 0; fn < kFunctionCount; ++fn)
+    for (int fn = 0; fn < FUNCTION_COUNT; ++fn)
         if (name == functionName(fn))
             fault.nFunction = fn;
     if (fault.nFunction < 0)

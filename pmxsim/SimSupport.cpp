@@ -41,19 +41,19 @@ struct SModel {
     const char* type;
     uint32_t code;
 };
-const SModel kModels[] = {{"PMX", 2},       {"PMX-M01", 3},   {"PMX-M02", 4},   {"PMX-M03", 11},  {"PMX-M04", 12},
-                          {"PMX-M05", 19},  {"PMX-M06", 20},  {"PMX-M07", 21},  {"PMX-M08", 81},  {"PMX-M09", 44},
-                          {"PMX-M10", 154}, {"PMX-M11", 150}, {"PMX-M12", 151}, {"PMX-M13", 152}, {"PMX-M14", 26},
-                          {"PMX-M15", 33},  {"PMX-M16", 98},  {"PMX-M17", 46},  {"PMX-M18", 82},  {"PMX-M19", 166},
-                          {"PMX-M20", 167}, {"PMX-M21", 35},  {"PMX-M22", 131}, {"PMX-M23", 149}, {"PMX-M24", 47},
-                          {"PMX-M25", 45},  {"PMX-M26", 22},  {"PMX-M27", 23},  {"PMX-M28", 24},  {"PMX-M29", 25},
-                          {"PMX-M30", 112}, {"PMX-M31", 168}, {"PMX-M32", 143}, {"PMX-M33", 144}};
+const SModel MODELS[] = {{"PMX", 2},       {"PMX-M01", 3},   {"PMX-M02", 4},   {"PMX-M03", 11},  {"PMX-M04", 12},
+                         {"PMX-M05", 19},  {"PMX-M06", 20},  {"PMX-M07", 21},  {"PMX-M08", 81},  {"PMX-M09", 44},
+                         {"PMX-M10", 154}, {"PMX-M11", 150}, {"PMX-M12", 151}, {"PMX-M13", 152}, {"PMX-M14", 26},
+                         {"PMX-M15", 33},  {"PMX-M16", 98},  {"PMX-M17", 46},  {"PMX-M18", 82},  {"PMX-M19", 166},
+                         {"PMX-M20", 167}, {"PMX-M21", 35},  {"PMX-M22", 131}, {"PMX-M23", 149}, {"PMX-M24", 47},
+                         {"PMX-M25", 45},  {"PMX-M26", 22},  {"PMX-M27", 23},  {"PMX-M28", 24},  {"PMX-M29", 25},
+                         {"PMX-M30", 112}, {"PMX-M31", 168}, {"PMX-M32", 143}, {"PMX-M33", 144}};
 
 struct SErrorText {
     int32_t code;
     const char* text;
 };
-const SErrorText kErrorTexts[] = {
+const SErrorText ERROR_TEXTS[] = {
     {PMX_SUCCESS, "No error"},
     {PMX_ERR_NO_MORE_RESULTS, "No further result available"},
     {PMX_INFO_COMMAND_IGNORED, "Command ignored: nothing to do in the current measurement state"},
@@ -76,7 +76,7 @@ const SErrorText kErrorTexts[] = {
 
 bool findModel(const std::string& type, uint32_t* code)
 {
-    for (const SModel& model : kModels) {
+    for (const SModel& model : MODELS) {
         if (type == model.type) {
             *code = model.code;
             return true;
@@ -87,7 +87,7 @@ bool findModel(const std::string& type, uint32_t* code)
 
 const char* errorText(int32_t code)
 {
-    for (const SErrorText& entry : kErrorTexts)
+    for (const SErrorText& entry : ERROR_TEXTS)
         if (entry.code == code)
             return entry.text;
     return nullptr;
@@ -121,13 +121,13 @@ bool sameSerial(const std::string& a, const char* b)
 
 bool validText(const char* text)
 {
-    return text != nullptr && *text != '\0' && std::strlen(text) <= kMaxText && std::strchr(text, ':') == nullptr &&
+    return text != nullptr && *text != '\0' && std::strlen(text) <= MAX_TEXT && std::strchr(text, ':') == nullptr &&
         std::strchr(text, ',') == nullptr;
 }
 
 void copyText(char* target, const std::string& text)
 {
-    size_t n = std::min(text.size(), kMaxText);
+    size_t n = std::min(text.size(), MAX_TEXT);
     std::memcpy(target, text.data(), n);
     target[n] = '\0';
 }

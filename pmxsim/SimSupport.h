@@ -15,14 +15,14 @@ const int32_t kDefaultAckMs = 0;
 const int32_t kDefaultMeasureMs = 10;
 const int32_t kDefaultTracePoints = 100;
 const int32_t kMaxTracePoints = 1024;
-const double kDefaultFrequencyHz = 1e9;
-const double kMinFrequencyHz = 10e6;
-const double kMaxFrequencyHz = 40e9;
+const double DEFAULT_FREQUENCY_HZ = 1e9;
+const double MIN_FREQUENCY_HZ = 10e6;
+const double MAX_FREQUENCY_HZ = 40e9;
 const int32_t kMaxAverageCount = 1024;
-const double kMaxOffsetDb = 100.0;
-const size_t kMaxPending = 1024;                     // oldest results are dropped beyond this
+const double MAX_OFFSET_DB = 100.0;
+const size_t MAX_PENDING = 1024;                     // oldest results are dropped beyond this
 const int32_t kMaxQueuedCount = 1 << 20;             // elements of one queued result
-const size_t kMaxText = 255;                         // device-info buffers hold 256 bytes
+const size_t MAX_TEXT = 255;                         // device-info buffers hold 256 bytes
 const int64_t kFirstHandle = (int64_t(1) << 32) + 1; // handles do not fit 32 bits on purpose
 
 // Trigger states that PmxGetTriggerState reports and the state-changed callback passes.
@@ -30,7 +30,7 @@ const int32_t kStateIdle = 0;
 const int32_t kStateWaitingForTrigger = 2;
 const int32_t kStateMeasuring = 3;
 
-const int kFunctionCount = 24; // library functions (EFunction)
+const int FUNCTION_COUNT = 24; // library functions (EFunction)
 
 // The model code of a type of the model table; false for other types.
 bool findModel(const std::string& type, uint32_t* code);
@@ -45,7 +45,7 @@ std::string trim(const std::string& text);
 bool sameSerial(const std::string& a, const char* b);
 // A type or serial that fits the device-info buffers and the PMXSIM_DEVICES syntax.
 bool validText(const char* text);
-// Copies text cut to kMaxText, zero-terminated, into a device-info buffer.
+// Copies text cut to MAX_TEXT, zero-terminated, into a device-info buffer.
 void copyText(char* target, const std::string& text);
 
 } // namespace PmxSim

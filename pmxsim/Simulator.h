@@ -63,7 +63,7 @@ enum EFunction {
     eSetStateChanged,
     eFunctionCount
 };
-static_assert(eFunctionCount == kFunctionCount, "one name per library function");
+static_assert(eFunctionCount == FUNCTION_COUNT, "one name per library function");
 
 enum ECallback { eCommandAccepted, eStateChanged, eDataAvailable, eErrorOccurred, eDeviceChanged, eCallbackCount };
 
@@ -120,7 +120,7 @@ private:
     struct SSettings {
         bool bTrace = false;
         int32_t nTracePoints = kDefaultTracePoints;
-        double dFrequencyHz = kDefaultFrequencyHz;
+        double dFrequencyHz = DEFAULT_FREQUENCY_HZ;
         bool bAveraging = false;
         int32_t nAverageCount = 1;
         double dOffsetDb = 0.0;

@@ -13,9 +13,9 @@
 namespace PmxSim {
 
 namespace {
-const float kPowerDbm = -20.0f;        // level of a measurement and of a pulse top
-const float kFloorDbm = -60.0f;        // level outside the pulse of a trace
-const double kResponseDbPerGHz = -0.2; // level change per GHz away from 1 GHz
+const float POWER_DBM = -20.0f;          // level of a measurement and of a pulse top
+const float FLOOR_DBM = -60.0f;          // level outside the pulse of a trace
+const double RESPONSE_DB_PER_GHZ = -0.2; // level change per GHz away from 1 GHz
 const char* const kScpiVersion = "1999.0";
 // Bits of the event status register.
 const int32_t kEventOperationComplete = 1;
@@ -71,7 +71,7 @@ float CSimulator::reading(const SSensor& sensor, double levelDbm, double spreadD
     const SSettings& settings = sensor.settings;
     if (settings.bAveraging)
         spreadDb /= std::sqrt(static_cast<double>(settings.nAverageCount));
-    double response = kResponseDbPerGHz * (settings.dFrequencyHz / 1e9 - 1.0);
+    double response = RESPONSE_DB_PER_GHZ * (settings.dFrequencyHz / 1e9 - 1.0);
     double dbm = levelDbm + response + settings.dOffsetDb + spreadDb;
     return static_cast<float>(settings.bWatt ? std::pow(10.0, (dbm - 30.0) / 10.0) : dbm);
 }
@@ -91,7 +91,7 @@ float CSimulator::powerReading(SSensor& sensor)
     case SPowerModel::eBuiltIn:
         break;
     }
-    return reading(sensor, kPowerDbm, noise());
+    return reading(sensor, POWER_DBM, noise());
 }
 
 // The built-in pulse is high in the middle half of the trace. A pulse of the scenario is sampled
@@ -107,7 +107,7 @@ void CSimulator::addTrace(SSensor& sensor)
     for (int32_t i = 0; i < points; ++i) {
         if (trace.bBuiltIn) {
             bool high = i >= points / 4 && i < points * 3 / 4;
-            result.floats.push_back(reading(sensor, high ? kPowerDbm : kFloorDbm, noise()));
+            result.floats.push_back(reading(sensor, high ? POWER_DBM : FLOOR_DBM, noise()));
             continue;
         }
         double t = trace.dDurationUs * i / points;
@@ -369,7 +369,7 @@ void CSimulator::addText(SSensor& sensor, const std::string& text)
 void CSimulator::addResult(SSensor& sensor, SResult result)
 {
     int32_t type = result.nType;
-    if (sensor.results.size() >= kMaxPending)
+    if (sensor.results.size() >= MAX_PENDING)
         sensor.results.pop_front();
     sensor.results.push_back(std::move(result));
     post(eDataAvailable, sensor.nHandle, type);

@@ -4,7 +4,7 @@ namespace LbPmxVisa {
 
 namespace {
 
-const unsigned kBlock = 1024;
+const unsigned BLOCK_SIZE = 1024;
 
 } // namespace
 
@@ -12,9 +12,9 @@ void CStringDataSerializer::serialize(CPmxDataBuffer& buffer) const
 {
     CPmxSession* session = buffer.getParent();
     // One byte more than the library may fill, so the text always ends in a zero byte.
-    char text[kBlock + 1] = {};
+    char text[BLOCK_SIZE + 1] = {};
     session->getParent()->callChecked(&CIPmxCommands::getStringResult, *session, text,
-                                      static_cast<std::int32_t>(kBlock));
+                                      static_cast<std::int32_t>(BLOCK_SIZE));
     buffer.write(std::string(text));
 }
 
@@ -41,11 +41,11 @@ const CPmxDataSerializer& CPmxDataSerializerFactory::get(EDataType type) const
             void serialize(CPmxDataBuffer& buffer) const override
             {
                 CPmxSession* session = buffer.getParent();
-                unsigned char block[kBlock] = {};
+                unsigned char block[BLOCK_SIZE] = {};
                 std::int32_t count = 0;
                 session->getParent()->callChecked(&CIPmxCommands::getBinaryResult, *session, block,
-                                                  static_cast<std::int32_t>(kBlock), &count);
-                buffer.write(&block, CCount::clamp(count, kBlock));
+                                                  static_cast<std::int32_t>(BLOCK_SIZE), &count);
+                buffer.write(&block, CCount::clamp(count, BLOCK_SIZE));
             }
         };
         static const CFloatArraySerializer serializer{};
@@ -64,11 +64,11 @@ const CPmxDataSerializer& CPmxDataSerializerFactory::get(EDataType type) const
             void serialize(CPmxDataBuffer& buffer) const override
             {
                 CPmxSession* session = buffer.getParent();
-                float values[kBlock] = {};
+                float values[BLOCK_SIZE] = {};
                 std::int32_t count = 0;
                 session->getParent()->callChecked(&CIPmxCommands::getFloatArray, *session, values,
-                                                  static_cast<std::int32_t>(kBlock), &count);
-                writeFloats(buffer, values, CCount::clamp(count, kBlock));
+                                                  static_cast<std::int32_t>(BLOCK_SIZE), &count);
+                writeFloats(buffer, values, CCount::clamp(count, BLOCK_SIZE));
             }
         };
         static const CFloatArraySerializer serializer{};
@@ -109,13 +109,13 @@ const CPmxDataSerializer& CPmxDataSerializerFactory::get(EDataType type) const
             void serialize(CPmxDataBuffer& buffer) const override
             {
                 CPmxSession* session = buffer.getParent();
-                float first[kBlock] = {};
-                float second[kBlock] = {};
-                float third[kBlock] = {};
+                float first[BLOCK_SIZE] = {};
+                float second[BLOCK_SIZE] = {};
+                float third[BLOCK_SIZE] = {};
                 std::int32_t count = 0;
                 session->getParent()->callChecked(&CIPmxCommands::getAuxFloatArray, *session, first, second, third,
-                                                  static_cast<std::int32_t>(kBlock), &count);
-                writeFloats(buffer, first, CCount::clamp(count, kBlock));
+                                                  static_cast<std::int32_t>(BLOCK_SIZE), &count);
+                writeFloats(buffer, first, CCount::clamp(count, BLOCK_SIZE));
             }
         };
         static const CFloatArraySerializer serializer{};

@@ -247,13 +247,13 @@ TEST_F(CLogTest, TwoThreadsWriteWholeLines)
 {
     const std::string path = tempPath("threads.log");
     std::remove(path.c_str());
-    const int kLines = 200;
+    const int LINES = 200;
     {
         CLogFileAppender appender(path);
         ASSERT_TRUE(appender.isOpen());
         auto writer = [](const char* name) {
             CLogger logger = CLogManager::getLogger(name);
-            for (int i = 0; i < kLines; ++i) {
+            for (int i = 0; i < LINES; ++i) {
                 logger.info("LbCore::CTest::write") << "line " << i << " of " << name;
             }
         };
@@ -263,7 +263,7 @@ TEST_F(CLogTest, TwoThreadsWriteWholeLines)
         b.join();
     }
     std::vector<std::string> lines = readLines(path);
-    ASSERT_EQ(2u * kLines, lines.size());
+    ASSERT_EQ(2u * LINES, lines.size());
     std::regex whole(std::string(kHead) +
                      R"(\[INFO \] (CWriter[AB]) - LbCore::CTest::write - line [0-9]+ of (CWriter[AB])$)");
     for (const std::string& line : lines) {

@@ -26,14 +26,14 @@ public:
 // Objects are made on one thread and freed on another, in no particular order.
 TEST(CMemoryPoolTest, ManagedObjectsComeAndGoFromSeveralThreads)
 {
-    const int kThreads = 4;
-    const int kObjects = 500;
+    const int THREADS = 4;
+    const int OBJECTS = 500;
     std::mutex mutex;
     std::vector<CManaged*> shared;
     std::vector<std::thread> threads;
-    for (int t = 0; t < kThreads; ++t) {
+    for (int t = 0; t < THREADS; ++t) {
         threads.emplace_back([&, t] {
-            for (int i = 0; i < kObjects; ++i) {
+            for (int i = 0; i < OBJECTS; ++i) {
                 CManaged* made = (i % 3 == 0) ? new (std::nothrow) CManaged(t) : new CManaged(t);
                 ASSERT_NE(nullptr, made);
                 CManaged* old = nullptr;

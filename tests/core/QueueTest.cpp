@@ -12,7 +12,7 @@ using namespace LbCore;
 
 namespace {
 
-const unsigned kInfinite = CSemaphore::INFINITE_WAIT;
+const unsigned INFINITE_WAIT_MS = CSemaphore::INFINITE_WAIT;
 
 struct CItem {
     explicit CItem(int value, std::atomic<int>* deletions = nullptr) : m_nValue(value), m_pnDeletions(deletions) { }
@@ -84,7 +84,7 @@ TEST(CQueueTest, InterruptWakesAWaitingConsumer)
     std::atomic<long> consumerId(-1);
     std::thread consumer([&] {
         consumerId = LbTests::currentThreadId();
-        result = popValue(queue, kInfinite);
+        result = popValue(queue, INFINITE_WAIT_MS);
     });
     while (consumerId.load() == -1) {
         std::this_thread::yield();
@@ -112,24 +112,24 @@ TEST(CQueueTest, DestructionDeletesEveryLeftItemExactlyOnce)
 
 TEST(CQueueTest, ManyProducersKeepTheirOrderAtOneConsumer)
 {
-    const int kProducers = 3;
-    const int kItems = 300;
+    const int PRODUCERS = 3;
+    const int ITEMS = 300;
     CQueue<CItem> queue(2);
     std::vector<std::thread> producers;
-    for (int p = 0; p < kProducers; ++p) {
+    for (int p = 0; p < PRODUCERS; ++p) {
         producers.emplace_back([&queue, p] {
-            for (int i = 0; i < kItems; ++i) {
-                queue.push(new CItem(p * kItems + i), 0);
+            for (int i = 0; i < ITEMS; ++i) {
+                queue.push(new CItem(p * ITEMS + i), 0);
             }
         });
     }
-    std::vector<int> next(kProducers, 0);
-    for (int n = 0; n < kProducers * kItems; ++n) {
+    std::vector<int> next(PRODUCERS, 0);
+    for (int n = 0; n < PRODUCERS * ITEMS; ++n) {
         int value = popValue(queue, 20000);
         ASSERT_GE(value, 0);
-        int producer = value / kItems;
-        EXPECT_EQ(next[producer], value % kItems);
-        next[producer] = value % kItems + 1;
+        int producer = value / ITEMS;
+        EXPECT_EQ(next[producer], value % ITEMS);
+        next[producer] = value % ITEMS + 1;
     }
     for (std::thread& producer : producers) {
         producer.join();

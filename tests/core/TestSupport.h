@@ -2,7 +2,7 @@
 #define LBTESTS_CORE_TESTSUPPORT_H
 // Helpers shared by the core tests: a one-shot latch and a log appender that keeps lines.
 #include "core/Log.h"
-#include "tests/ThreadState.h"
+#include "tests/Waiting.h"
 
 #include <chrono>
 #include <condition_variable>
@@ -12,9 +12,6 @@
 
 namespace LbTests {
 
-// Generous: a latch that is not opened within this time means the code under test hangs.
-const std::chrono::seconds kDeadline(20);
-
 class CLatch {
 public:
     void open()
@@ -23,7 +20,7 @@ public:
         m_bOpen = true;
         m_cCondition.notify_all();
     }
-    bool waitOpen() { return waitOpenFor(kDeadline); }
+    bool waitOpen() { return waitOpenFor(DEADLINE); }
     // For checks that something has NOT happened yet: a short, bounded look.
     template <class Duration> bool waitOpenFor(Duration wait)
     {
@@ -80,7 +77,7 @@ public:
     bool waitFor(const std::string& piece)
     {
         std::unique_lock<std::mutex> lock(m_cMutex);
-        return m_cCondition.wait_for(lock, kDeadline, [&] {
+        return m_cCondition.wait_for(lock, DEADLINE, [&] {
             for (const std::string& line : m_cLines) {
                 if (line.find(piece) != std::string::npos) {
                     return true;

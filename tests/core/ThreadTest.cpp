@@ -20,7 +20,7 @@ using namespace LbCore;
 
 namespace {
 
-const unsigned kInfinite = CSemaphore::INFINITE_WAIT;
+const unsigned INFINITE_WAIT_MS = CSemaphore::INFINITE_WAIT;
 
 struct CMessage {
     virtual ~CMessage() { }
@@ -46,7 +46,7 @@ public:
             return true;
         }
         CMessage* message = nullptr;
-        int result = m_cQueue.pop(message, kInfinite);
+        int result = m_cQueue.pop(message, INFINITE_WAIT_MS);
         delete message;
         return result == 0;
     }
@@ -102,7 +102,7 @@ protected:
 // Polls (yielding) until the thread is idle, without consuming its end signal as join() would.
 bool waitIdle(const CThread& thread)
 {
-    auto deadline = std::chrono::steady_clock::now() + LbTests::kDeadline;
+    auto deadline = std::chrono::steady_clock::now() + LbTests::DEADLINE;
     while (thread.getState() != CThread::STATE_IDLE) {
         if (std::chrono::steady_clock::now() > deadline) {
             return false;
@@ -119,7 +119,7 @@ TEST_F(CThreadTest, StartStopAndJoinResults)
     CWorker worker;
     CThread thread(worker);
     EXPECT_EQ(3, thread.stop());
-    EXPECT_EQ(3, thread.stopAndJoin(kInfinite));
+    EXPECT_EQ(3, thread.stopAndJoin(INFINITE_WAIT_MS));
     EXPECT_EQ(0, thread.join(0)); // an idle thread is joined at once
     EXPECT_TRUE(thread.attach(m_cFirst));
 
@@ -130,7 +130,7 @@ TEST_F(CThreadTest, StartStopAndJoinResults)
     EXPECT_EQ(6, thread.join(50));
     EXPECT_EQ(CThread::STATE_RUNNING, thread.getState());
 
-    EXPECT_EQ(0, thread.stopAndJoin(kInfinite));
+    EXPECT_EQ(0, thread.stopAndJoin(INFINITE_WAIT_MS));
     EXPECT_EQ(CThread::STATE_IDLE, thread.getState());
     EXPECT_EQ(1, worker.m_nInits.load()); // the second start made no thread
     EXPECT_EQ(1, worker.m_nCleanups.load());
@@ -149,9 +149,9 @@ TEST_F(CThreadTest, StopWhileStoppingAndStartWhileStoppingReturnTwo)
     EXPECT_EQ(CThread::STATE_STOPPING, thread.getState());
     EXPECT_EQ(2, thread.stop());
     EXPECT_EQ(2, thread.start());
-    EXPECT_EQ(2, thread.stopAndJoin(kInfinite));
+    EXPECT_EQ(2, thread.stopAndJoin(INFINITE_WAIT_MS));
     worker.m_cQueue.interrupt();
-    EXPECT_EQ(0, thread.join(kInfinite));
+    EXPECT_EQ(0, thread.join(INFINITE_WAIT_MS));
     EXPECT_EQ(CThread::STATE_IDLE, thread.getState());
 }
 
@@ -162,7 +162,7 @@ TEST_F(CThreadTest, InitFalseSkipsTheLoopButNotifiesObserversOnce)
     CThread thread(worker);
     thread.attach(m_cFirst);
     EXPECT_EQ(0, thread.start());
-    EXPECT_EQ(0, thread.join(kInfinite));
+    EXPECT_EQ(0, thread.join(INFINITE_WAIT_MS));
     EXPECT_EQ(CThread::STATE_IDLE, thread.getState());
     EXPECT_EQ(0, worker.m_nRuns.load());
     EXPECT_EQ(std::vector<int>{1}, calls());
@@ -178,7 +178,7 @@ TEST_F(CThreadTest, ObserversRunInAttachmentOrderWhenRunEnds)
     ASSERT_EQ(0, thread.start());
     worker.m_cQueue.interrupt(); // run() returns false
     ASSERT_TRUE(waitIdle(thread));
-    EXPECT_EQ(0, thread.join(kInfinite)); // idle: returns at once, the end signal stays unused
+    EXPECT_EQ(0, thread.join(INFINITE_WAIT_MS)); // idle: returns at once, the end signal stays unused
     EXPECT_EQ(1, worker.m_nRuns.load());
     EXPECT_EQ((std::vector<int>{2, 1}), calls());
 
@@ -186,7 +186,7 @@ TEST_F(CThreadTest, ObserversRunInAttachmentOrderWhenRunEnds)
     EXPECT_FALSE(thread.detach(m_cSecond));
     ASSERT_EQ(0, thread.start());  // a thread can be started again after its end
     EXPECT_EQ(6, thread.join(30)); // the end of the first run must not satisfy this join
-    EXPECT_EQ(0, thread.stopAndJoin(kInfinite));
+    EXPECT_EQ(0, thread.stopAndJoin(INFINITE_WAIT_MS));
     EXPECT_EQ((std::vector<int>{2, 1, 1}), calls());
 }
 
@@ -195,7 +195,7 @@ TEST_F(CThreadTest, ThreadWithItsOwnHooksEndsAtOnce)
     CThread thread;
     thread.attach(m_cFirst);
     EXPECT_EQ(0, thread.start());
-    EXPECT_EQ(0, thread.join(kInfinite));
+    EXPECT_EQ(0, thread.join(INFINITE_WAIT_MS));
     EXPECT_EQ(std::vector<int>{1}, calls());
 }
 
@@ -229,7 +229,7 @@ TEST_F(CThreadTest, WorkerStackIsSmallButRoomy)
     CStackProbe probe;
     CThread thread(probe);
     ASSERT_EQ(0, thread.start());
-    EXPECT_EQ(0, thread.join(kInfinite));
+    EXPECT_EQ(0, thread.join(INFINITE_WAIT_MS));
 #if !defined(_WIN32)
     EXPECT_LT(probe.m_nStackSize, 1024u * 1024u);
     EXPECT_GT(probe.m_nStackSize, 128u * 1024u);
@@ -244,7 +244,7 @@ TEST_F(CThreadTest, SpinningRunIsStoppedBetweenCalls)
     ASSERT_EQ(0, thread.start());
     EXPECT_EQ(6, thread.join(100));
     EXPECT_EQ(CThread::STATE_RUNNING, thread.getState());
-    EXPECT_EQ(0, thread.stopAndJoin(kInfinite));
+    EXPECT_EQ(0, thread.stopAndJoin(INFINITE_WAIT_MS));
     EXPECT_EQ(CThread::STATE_IDLE, thread.getState());
 }
 
@@ -256,7 +256,7 @@ TEST_F(CThreadTest, ExceptionFromRunEndsTheThreadAndIsLogged)
     CThread thread(worker);
     thread.attach(m_cFirst);
     ASSERT_EQ(0, thread.start());
-    EXPECT_EQ(0, thread.join(kInfinite));
+    EXPECT_EQ(0, thread.join(INFINITE_WAIT_MS));
     EXPECT_EQ(std::vector<int>{1}, calls());
     EXPECT_TRUE(capture.contains("[ERROR] CThread - LbCore::CThread::work - "));
     EXPECT_TRUE(capture.contains("run failed"));

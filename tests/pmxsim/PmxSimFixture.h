@@ -4,6 +4,7 @@
 #define TESTS_PMXSIM_PMXSIMFIXTURE_H
 
 #include "pmxsim/PmxSim.h"
+#include "tests/Waiting.h"
 
 #include <gtest/gtest.h>
 
@@ -18,7 +19,7 @@
 
 namespace PmxSimTesting {
 
-const std::chrono::seconds kDeadline(20);
+using LbTests::DEADLINE;
 
 enum EKind { eAccepted, eState, eData, eError, eDevice };
 
@@ -53,7 +54,7 @@ public:
     bool waitFor(const std::function<bool(const SCall&)>& pred, size_t count = 1)
     {
         std::unique_lock<std::mutex> lock(m_aMutex);
-        return m_aChanged.wait_for(lock, kDeadline, [&] {
+        return m_aChanged.wait_for(lock, DEADLINE, [&] {
             size_t matching = 0;
             for (const SCall& call : m_aCalls)
                 matching += pred(call) ? 1 : 0;
@@ -63,7 +64,7 @@ public:
     bool waitCount(size_t count)
     {
         std::unique_lock<std::mutex> lock(m_aMutex);
-        return m_aChanged.wait_for(lock, kDeadline, [&] { return m_aCalls.size() >= count; });
+        return m_aChanged.wait_for(lock, DEADLINE, [&] { return m_aCalls.size() >= count; });
     }
     std::vector<SCall> calls()
     {

@@ -330,7 +330,7 @@ TEST_F(PmxSimTest, CallbacksMayCallBackIntoTheLibraryAndCloseIt)
     registerAll(&hooked);
     ASSERT_EQ(0, PmxSendCommand(handle, "init:imm", 0));
     std::future<std::pair<int32_t, int32_t>> done = results.get_future();
-    ASSERT_EQ(std::future_status::ready, done.wait_for(kDeadline));
+    ASSERT_EQ(std::future_status::ready, done.wait_for(DEADLINE));
     EXPECT_EQ(std::make_pair(0, 0), done.get());
     // Replacing the callbacks waits until the hooked one has returned.
     registerAll(&m_aRecorder);
@@ -342,13 +342,13 @@ TEST_F(PmxSimTest, CallbacksMayCallBackIntoTheLibraryAndCloseIt)
 
 TEST_F(PmxSimTest, ConcurrentUseFromSeveralThreads)
 {
-    const int kRounds = 30;
+    const int ROUNDS = 30;
     int64_t a = open();
     int64_t b = open("USB::0x0c6f::0154::100001");
     ASSERT_EQ(0, PmxSimSetDelays(0, 1));
     std::atomic<int> failures(0);
     auto measure = [&](int64_t handle) {
-        for (int i = 0; i < kRounds; ++i) {
+        for (int i = 0; i < ROUNDS; ++i) {
             if (PmxSendCommand(handle, i % 2 ? "*trg" : "*idn?", 0) != 0)
                 ++failures;
             int32_t type = 0;
@@ -364,7 +364,7 @@ TEST_F(PmxSimTest, ConcurrentUseFromSeveralThreads)
     };
     auto churn = [&] {
         CRecorder other;
-        for (int i = 0; i < kRounds; ++i) {
+        for (int i = 0; i < ROUNDS; ++i) {
             if (PmxSimAttach("PMX-M02", "777") != 0 || PmxSimDetach("777") != 0)
                 ++failures;
             PmxSetNotifyCallbackErrorOccurred(i % 2 ? onError : nullptr, &other);
@@ -383,7 +383,7 @@ TEST_F(PmxSimTest, ConcurrentUseFromSeveralThreads)
     t3.join();
     EXPECT_EQ(0, failures.load());
     // Every command of both sensors is acknowledged exactly once, in order per sensor.
-    ASSERT_TRUE(m_aRecorder.waitFor(isAccepted, 2 * kRounds));
+    ASSERT_TRUE(m_aRecorder.waitFor(isAccepted, 2 * ROUNDS));
     int32_t lastA = 0, lastB = 0;
     for (const SCall& c : m_aRecorder.calls()) {
         if (c.kind != eAccepted)
@@ -392,8 +392,8 @@ TEST_F(PmxSimTest, ConcurrentUseFromSeveralThreads)
         EXPECT_EQ(last + 1, c.value);
         last = c.value;
     }
-    EXPECT_EQ(kRounds, lastA);
-    EXPECT_EQ(kRounds, lastB);
+    EXPECT_EQ(ROUNDS, lastA);
+    EXPECT_EQ(ROUNDS, lastB);
 }
 
 } // namespace

@@ -34,7 +34,7 @@ public:
     bool waitSize(std::size_t size)
     {
         std::unique_lock<std::mutex> lock(m_cMutex);
-        return m_cCondition.wait_for(lock, LbTests::kSensorDeadline, [&] { return m_cEntries.size() >= size; });
+        return m_cCondition.wait_for(lock, LbTests::SENSOR_DEADLINE, [&] { return m_cEntries.size() >= size; });
     }
     std::vector<std::string> entries()
     {

@@ -1,5 +1,6 @@
 // The sensor-library adapter against the simulated library: the driver-open flag, installing
 // and removing the callbacks, event forwarding and its filter, and the argument orders.
+#include "tests/Waiting.h"
 #include "pmxsim/PmxSim.h"
 #include "sensor/PmxControl.h"
 #include "sensor/PmxResourceInfo.h"
@@ -27,7 +28,7 @@ using LbPmxVisa::CPmxSessionDispatcher;
 
 namespace {
 
-const std::chrono::seconds kDeadline(20);
+using LbTests::DEADLINE;
 
 struct SNote {
     std::string operation;
@@ -56,7 +57,7 @@ public:
     bool waitCount(std::size_t count)
     {
         std::unique_lock<std::mutex> lock(m_cMutex);
-        return m_cCondition.wait_for(lock, kDeadline, [&] { return m_cNotes.size() >= count; });
+        return m_cCondition.wait_for(lock, DEADLINE, [&] { return m_cNotes.size() >= count; });
     }
     std::vector<SNote> notes()
     {
@@ -114,7 +115,7 @@ bool drainEvents(const char* serial)
         return false;
     }
     std::unique_lock<std::mutex> lock(marker.mutex);
-    return marker.condition.wait_for(lock, kDeadline, [&] { return marker.count > before; });
+    return marker.condition.wait_for(lock, DEADLINE, [&] { return marker.count > before; });
 }
 
 class PmxControlTest : public ::testing::Test {

@@ -7,7 +7,7 @@
 namespace LbTests {
 
 typedef CLatch CGate;
-const std::chrono::seconds kSensorDeadline = kDeadline;
+const std::chrono::seconds SENSOR_DEADLINE = DEADLINE;
 
 // Attaches itself for its lifetime at DEBUG level and restores the threshold it found.
 class CLogCapture : public CCaptureAppender {

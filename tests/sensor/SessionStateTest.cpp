@@ -13,7 +13,7 @@ using LbPmxVisa::CPmxSessionDispatcher;
 namespace {
 
 typedef const CIPmxSessionState* (*CAccessor)();
-const CAccessor kStates[] = {
+const CAccessor STATES[] = {
     &CIPmxSessionState::noData,
     &CIPmxSessionState::waitingForData,
     &CIPmxSessionState::dataAvailable,
@@ -54,10 +54,10 @@ protected:
 TEST_F(SessionState, EveryTransitionOfTheTable)
 {
     for (int current = 0; current < 7; ++current) {
-        EXPECT_EQ(kNames[current], kStates[current]()->getName());
+        EXPECT_EQ(kNames[current], STATES[current]()->getName());
         for (int target = 0; target < 7; ++target) {
-            const CIPmxSessionState* from = kStates[current]();
-            const CIPmxSessionState* to = kStates[target]();
+            const CIPmxSessionState* from = STATES[current]();
+            const CIPmxSessionState* to = STATES[target]();
             SCOPED_TRACE(std::string(kNames[current]) + " -> " + kNames[target]);
             if (kTable[current][target] == R) {
                 try {
@@ -69,7 +69,7 @@ TEST_F(SessionState, EveryTransitionOfTheTable)
                               e.what());
                 }
             } else {
-                EXPECT_EQ(kStates[kTable[current][target]](), from->nextState(session(), to));
+                EXPECT_EQ(STATES[kTable[current][target]](), from->nextState(session(), to));
             }
             // Only WaitingForData -> DataAvailable hands a count to a waiting reader, once.
             EXPECT_EQ(current == 1 && target == 2, session().getDataSemaphore().wait(0));

@@ -59,7 +59,7 @@ private:
     bool waitFor(const int& counter, int count)
     {
         std::unique_lock<std::mutex> lock(m_cMutex);
-        return m_cCondition.wait_for(lock, LbTests::kSensorDeadline, [&] { return counter >= count; });
+        return m_cCondition.wait_for(lock, LbTests::SENSOR_DEADLINE, [&] { return counter >= count; });
     }
 
     std::mutex m_cMutex;

@@ -1,6 +1,6 @@
 // Events raised by the test passport (a write "EVENT n" raises n service requests) and their
 // delivery through the VISA queue and handlers.
-#include "tests/ThreadState.h"
+#include "tests/Waiting.h"
 
 #include <atomic>
 #include <chrono>

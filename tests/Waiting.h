@@ -1,8 +1,8 @@
-#ifndef LBTESTS_THREADSTATE_H
-#define LBTESTS_THREADSTATE_H
-// Lets a test wake a waiter that is really waiting: a thread's kernel id and a bounded wait until
-// that thread sleeps in the kernel (Linux; elsewhere both do nothing and the test runs without
-// that guarantee).
+#ifndef LBTESTS_WAITING_H
+#define LBTESTS_WAITING_H
+// How long tests wait, and how a test wakes a waiter that is really waiting: a thread's kernel id
+// and a bounded wait until that thread sleeps in the kernel (Linux; elsewhere both do nothing and
+// the test runs without that guarantee).
 #include <chrono>
 #include <fstream>
 #include <string>
@@ -15,6 +15,9 @@
 
 namespace LbTests {
 
+// Generous: what has not happened within this time means the code under test hangs.
+const std::chrono::seconds DEADLINE(20);
+
 // The calling thread's kernel id where the system has one (Linux), else 0.
 inline long currentThreadId()
 {
@@ -25,7 +28,7 @@ inline long currentThreadId()
 #endif
 }
 
-// Waits (at most 20 s) until the thread with that kernel id sleeps in the kernel, so a
+// Waits (at most DEADLINE) until the thread with that kernel id sleeps in the kernel, so a
 // test can wake a waiter that is really waiting. Where thread states cannot be read (id 0, or
 // not Linux) it returns at once: the test then still runs, only without that guarantee.
 inline bool waitUntilSleeping(long threadId)
@@ -35,7 +38,7 @@ inline bool waitUntilSleeping(long threadId)
         return true;
     }
     const std::string path = "/proc/self/task/" + std::to_string(threadId) + "/stat";
-    const auto end = std::chrono::steady_clock::now() + std::chrono::seconds(20);
+    const auto end = std::chrono::steady_clock::now() + DEADLINE;
     while (std::chrono::steady_clock::now() < end) {
         std::ifstream stat(path);
         std::string line;
