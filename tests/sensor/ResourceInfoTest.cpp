@@ -103,21 +103,6 @@ TEST(ResourceInfoFormat, VisaFormParsesBackToAnEqualInfo)
     EXPECT_NE(CPmxResourceInfo("LBPMX::3::A"), CPmxResourceInfo("LBPMX::3::B"));
 }
 
-TEST(ResourceInfoModelTable, HoldsTheModelsInOrder)
-{
-    typedef std::vector<std::pair<std::string, std::uint32_t>> TRows;
-    const TRows expected = {
-        {"PMX", 2},       {"PMX-M01", 3},   {"PMX-M02", 4},   {"PMX-M03", 11},  {"PMX-M04", 12},  {"PMX-M05", 19},
-        {"PMX-M06", 20},  {"PMX-M07", 21},  {"PMX-M08", 81},  {"PMX-M09", 44},  {"PMX-M10", 154}, {"PMX-M11", 150},
-        {"PMX-M12", 151}, {"PMX-M13", 152}, {"PMX-M14", 26},  {"PMX-M15", 33},  {"PMX-M16", 98},  {"PMX-M17", 46},
-        {"PMX-M18", 82},  {"PMX-M19", 166}, {"PMX-M20", 167}, {"PMX-M21", 35},  {"PMX-M22", 131}, {"PMX-M23", 149},
-        {"PMX-M24", 47},  {"PMX-M25", 45},  {"PMX-M26", 22},  {"PMX-M27", 23},  {"PMX-M28", 24},  {"PMX-M29", 25},
-        {"PMX-M30", 112}, {"PMX-M31", 168}, {"PMX-M32", 143}, {"PMX-M33", 144},
-    };
-    const CPmxResourceInfo::TModelTable& table = CPmxResourceInfo::getModelTable();
-    EXPECT_EQ(expected, TRows(table.begin(), table.end()));
-}
-
 TEST(ResourceInfoModelTable, LooksUpTypeTextsExactly)
 {
     const CPmxResourceInfo info("PMX", "abc");

@@ -1,123 +1,43 @@
 // Sensor sessions and the session dispatcher against the simulated sensor library: commands
 // and acknowledgements, sensor errors, the busy rule, the status byte, the error queue, session
 // recycling, enumeration, event routing and the driver's lifetime.
-#include "pmxsim/PmxSim.h"
-#include "sensor/PmxControl.h"
-#include "sensor/PmxDataBuffer.h"
-#include "sensor/PmxSession.h"
-#include "sensor/PmxSessionDispatcher.h"
-#include "sensor/PmxSessionState.h"
-#include "tests/sensor/SensorTestSupport.h"
+#include "tests/sensor/SimSessionFixture.h"
 
 #include <gtest/gtest.h>
 
 #include <boost/shared_ptr.hpp>
 #include <chrono>
-#include <condition_variable>
 #include <cstdint>
-#include <mutex>
 #include <stdexcept>
 #include <string>
 #include <thread>
 #include <vector>
 
 using LbPmxVisa::CIPmxSessionState;
-using LbPmxVisa::CPmxControl;
 using LbPmxVisa::CPmxDataBuffer;
 using LbPmxVisa::CPmxEvent;
 using LbPmxVisa::CPmxResourceInfo;
 using LbPmxVisa::CPmxSession;
 using LbPmxVisa::CPmxSessionDispatcher;
-using LbTests::CGate;
 using LbTests::CLogCapture;
+using LbTests::kResource;
+using LbTests::kSerial;
 
 namespace {
 
-const char* const kResource = "LBPMX::0x0003::100000::INSTR";
-const char* const kSerial = "100000";
-
-// Counts what the session's event thread delivered; subscribed after the session, so when it
-// has heard an event the session has reacted to it.
-class CCounter : public LbPmxVisa::CIPmxEventListener {
-public:
-    void notifyCommandAcceptedEvent(const CPmxEvent&) override { }
-    void notifyDataAvailableEvent(const CPmxEvent&) override { bump(m_nData); }
-    void notifyErrorOccuredEvent(const CPmxEvent&) override { bump(m_nErrors); }
-    void notifyStateChangedEvent(const CPmxEvent&) override { }
-    void notifyDeviceChangedEvent(const CPmxEvent&) override { }
-
-    bool waitData(int count) { return waitFor(m_nData, count); }
-    bool waitErrors(int count) { return waitFor(m_nErrors, count); }
-
-private:
-    void bump(int& counter)
-    {
-        std::lock_guard<std::mutex> lock(m_cMutex);
-        ++counter;
-        m_cCondition.notify_all();
-    }
-    bool waitFor(const int& counter, int count)
-    {
-        std::unique_lock<std::mutex> lock(m_cMutex);
-        return m_cCondition.wait_for(lock, LbTests::SENSOR_DEADLINE, [&] { return counter >= count; });
-    }
-
-    std::mutex m_cMutex;
-    std::condition_variable m_cCondition;
-    int m_nData = 0;
-    int m_nErrors = 0;
-};
-
-class SessionTest : public ::testing::Test {
+// The shared fixture without a session at the start: these tests open it themselves, after
+// their log capture, or test the dispatcher with none open. Every test leaves no session
+// behind and the driver closed.
+class SessionTest : public LbTests::CSimSession {
 protected:
-    static CPmxControl& control()
-    {
-        static CPmxControl s_cControl;
-        return s_cControl;
-    }
-    static CPmxSessionDispatcher& dispatcher() { return CPmxSessionDispatcher::getInstance(); }
-    static void SetUpTestSuite() { CPmxSessionDispatcher::attach(&control()); }
-    static void TearDownTestSuite() { CPmxSessionDispatcher::detach(&control()); }
-
-    void SetUp() override { ASSERT_EQ(0, PmxSimReset()); }
+    SessionTest() { m_bOpenInSetUp = false; }
 
     void TearDown() override
     {
-        if (m_pSession) {
-            m_pSession->getEventDispatcher().removeListener(&m_cCounter);
-            m_pSession.reset();
-        }
+        CSimSession::TearDown();
         EXPECT_EQ(0u, dispatcher().getActiveSessionCount());
         EXPECT_FALSE(control().isDriverOpen());
     }
-
-    CPmxSession& open()
-    {
-        m_pSession = dispatcher().getSession(CPmxResourceInfo(kResource));
-        m_pSession->getEventDispatcher().addListener(&m_cCounter);
-        return *m_pSession;
-    }
-
-    std::string read(std::size_t capacity = 256)
-    {
-        std::vector<char> storage(capacity + 1, 0);
-        std::uint32_t count = 0;
-        CPmxDataBuffer buffer(*m_pSession, storage.data(), capacity, &count);
-        m_pSession->read(buffer);
-        return std::string(storage.data(), count);
-    }
-
-    std::uint16_t statusByte()
-    {
-        std::uint16_t status = 0xFFFF;
-        m_pSession->readSTB(&status);
-        return status;
-    }
-
-    static std::int32_t codeOf(std::uint32_t code) { return static_cast<std::int32_t>(code); }
-
-    boost::shared_ptr<CPmxSession> m_pSession;
-    CCounter m_cCounter;
 };
 
 // ---- writing and acknowledgements
@@ -147,7 +67,7 @@ TEST_F(SessionTest, CommandStringsAreSplitLowerCasedAndClassified)
     EXPECT_EQ(1u, session.getCommandCount());
     EXPECT_EQ(1u, capture.count("Execute PmxSendCommand(...) [*idn?]"));
     EXPECT_EQ(1u, capture.count(" - fetch command executed [Id: "));
-    ASSERT_TRUE(m_cCounter.waitData(1));
+    ASSERT_TRUE(m_cListener.waitData(1));
     EXPECT_EQ(0u, read().find("Marlowe&Tenby,"));
 
     for (const char* fetch : {"FETCh?", "fetch?\n", "FETC?", ":FETCH?"}) {
@@ -196,7 +116,7 @@ TEST_F(SessionTest, SensorErrorFailsTheWaitingWriteAfterItsAcknowledgementAndIsQ
     std::thread writer = writeAndFail("*RST", failure);
     ASSERT_TRUE(capture.waitFor("Execute PmxSendCommand(...) [*rst]"));
     ASSERT_EQ(0, PmxSimReportError(kSerial, code));
-    ASSERT_TRUE(m_cCounter.waitErrors(1));
+    ASSERT_TRUE(m_cListener.waitErrors(1));
     CPmxEvent accepted = {session.getHandle(), 1};
     dispatcher().notifyCommandAcceptedEvent(accepted);
     writer.join();
@@ -295,12 +215,12 @@ TEST_F(SessionTest, StatusByteCombinesErrorQueueResultAndTriggerState)
     EXPECT_EQ(0, statusByte());
 
     ASSERT_EQ(0, PmxSimReportError(kSerial, codeOf(PMXSIM_E_INVALID_HANDLE)));
-    ASSERT_TRUE(m_cCounter.waitErrors(1));
+    ASSERT_TRUE(m_cListener.waitErrors(1));
     EXPECT_EQ(4, statusByte());
 
     float value = -20.0f;
     ASSERT_EQ(0, PmxSimQueueResult(kSerial, 6, &value, 1));
-    ASSERT_TRUE(m_cCounter.waitData(1));
+    ASSERT_TRUE(m_cListener.waitData(1));
     EXPECT_EQ(4 + 16, statusByte());
 
     ASSERT_EQ(0, PmxSimSetTriggerState(kSerial, 3));
@@ -329,7 +249,7 @@ TEST_F(SessionTest, ErrorQueueAnswersLastRecordedFirstThenNoError)
 
     ASSERT_EQ(0, PmxSimReportError(kSerial, codeOf(PMXSIM_E_NO_SUCH_SENSOR)));
     ASSERT_EQ(0, PmxSimReportError(kSerial, LbPmxVisa::PMX_NO_FURTHER_RESULT));
-    ASSERT_TRUE(m_cCounter.waitErrors(2));
+    ASSERT_TRUE(m_cListener.waitErrors(2));
     EXPECT_EQ(4, statusByte());
 
     session.write("SYSTem:ERRor?");
@@ -343,7 +263,7 @@ TEST_F(SessionTest, ErrorQueueAnswersLastRecordedFirstThenNoError)
     // A reply that does not fit is kept whole for the next read, once; the status byte
     // announces it as an answer waiting.
     ASSERT_EQ(0, PmxSimReportError(kSerial, codeOf(PMXSIM_E_NO_SUCH_SENSOR)));
-    ASSERT_TRUE(m_cCounter.waitErrors(3));
+    ASSERT_TRUE(m_cListener.waitErrors(3));
     session.write("SYST:ERR?");
     EXPECT_THROW(read(10), CPmxDataBuffer::CPmxDataBufferOverFlowException);
     EXPECT_THROW(read(37), CPmxDataBuffer::CPmxDataBufferOverFlowException);

@@ -1,15 +1,17 @@
 #ifndef LBTESTS_SENSOR_SIMSESSIONFIXTURE_H
 #define LBTESTS_SENSOR_SIMSESSIONFIXTURE_H
 // A real sensor session on the simulated library: the adapter attached to the session
-// dispatcher, one open session on the default sensor "100000" per test, a listener that counts
-// data notifications (it subscribes after the session, so when it hears one the session has
-// already changed its state), and helpers to queue results and read replies.
+// dispatcher, one open session on the default sensor "100000" per test (or, for tests of the
+// dispatcher, none until the test calls open()), a listener that counts data and error
+// notifications (it subscribes after the session, so when it hears one the session has already
+// changed its state), and helpers to queue results, read replies and the status byte.
 #include "pmxsim/PmxSim.h"
 #include "sensor/PmxControl.h"
 #include "sensor/PmxDataBuffer.h"
 #include "sensor/PmxSession.h"
 #include "sensor/PmxSessionDispatcher.h"
 #include "sensor/PmxSessionState.h"
+#include "tests/sensor/SensorTestSupport.h"
 
 #include <gtest/gtest.h>
 
@@ -24,6 +26,7 @@
 
 namespace LbTests {
 
+const char* const kResource = "LBPMX::0x0003::100000::INSTR";
 const char* const kSerial = "100000";
 
 class CDataListener : public LbPmxVisa::CIPmxEventListener {
@@ -52,7 +55,7 @@ private:
     bool waitFor(const int& counter, int count)
     {
         std::unique_lock<std::mutex> lock(m_cMutex);
-        return m_cCondition.wait_for(lock, std::chrono::seconds(20), [&] { return counter >= count; });
+        return m_cCondition.wait_for(lock, SENSOR_DEADLINE, [&] { return counter >= count; });
     }
 
     std::mutex m_cMutex;
@@ -68,16 +71,24 @@ protected:
         static LbPmxVisa::CPmxControl control;
         return control;
     }
+    static LbPmxVisa::CPmxSessionDispatcher& dispatcher() { return LbPmxVisa::CPmxSessionDispatcher::getInstance(); }
     static void SetUpTestSuite() { LbPmxVisa::CPmxSessionDispatcher::attach(&control()); }
     static void TearDownTestSuite() { LbPmxVisa::CPmxSessionDispatcher::detach(&control()); }
 
     void SetUp() override
     {
         ASSERT_EQ(0, PmxSimReset());
-        m_pSession = LbPmxVisa::CPmxSessionDispatcher::getInstance().getSession(
-            LbPmxVisa::CPmxResourceInfo("LBPMX::0x0003::100000::INSTR"));
-        ASSERT_TRUE(m_pSession);
-        ASSERT_TRUE(m_pSession->getEventDispatcher().addListener(&m_cListener));
+        if (m_bOpenInSetUp) {
+            open();
+        }
+    }
+
+    // Opens the session on the default sensor and subscribes the listener.
+    LbPmxVisa::CPmxSession& open()
+    {
+        m_pSession = dispatcher().getSession(LbPmxVisa::CPmxResourceInfo(kResource));
+        EXPECT_TRUE(m_pSession->getEventDispatcher().addListener(&m_cListener));
+        return *m_pSession;
     }
 
     void TearDown() override
@@ -121,6 +132,15 @@ protected:
         return std::string(storage.data(), count);
     }
 
+    std::uint16_t statusByte()
+    {
+        std::uint16_t status = 0xFFFF;
+        session().readSTB(&status);
+        return status;
+    }
+
+    static std::int32_t codeOf(std::uint32_t code) { return static_cast<std::int32_t>(code); }
+
     // Little-endian IEEE 754 single precision bytes of one float.
     static std::string bytesOf(float value)
     {
@@ -133,6 +153,7 @@ protected:
         return bytes;
     }
 
+    bool m_bOpenInSetUp = true;
     boost::shared_ptr<LbPmxVisa::CPmxSession> m_pSession;
     CDataListener m_cListener;
     int m_nQueued = 0;
