@@ -207,11 +207,11 @@ void BM_SrqCycle(benchmark::State& state)
         state.SkipWithError("installing the handler failed");
         return;
     }
-    const unsigned long kRequestsPerCycle = 3;
+    const unsigned long REQUESTS_PER_CYCLE = 3;
     unsigned long expected = 0;
     COperationCounters counters;
     for (auto _ : state) {
-        expected += kRequestsPerCycle;
+        expected += REQUESTS_PER_CYCLE;
         if (!triggerFetchRead(state, session, buffer) || !LB_REQUIRE(state, counter.waitFor(expected)))
             break;
     }

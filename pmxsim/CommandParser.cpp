@@ -45,9 +45,9 @@ const SEntry COMMANDS[] = {
     {"READ", eRead, eNoParameter, eQueryOnly, 0, 0},
     {"MEASure [POWer]", eMeasurePower, eNoParameter, eQueryOnly, 0, 0},
     {"FUNCtion", eFunction, eFunctionChoice, eSetAndQuery, 0, 0},
-    {"TRACe POINts", eTracePoints, eInteger, eSetAndQuery, 1, kMaxTracePoints},
+    {"TRACe POINts", eTracePoints, eInteger, eSetAndQuery, 1, MAX_TRACE_POINTS},
     {"[SENSe] FREQuency", eFrequency, eReal, eSetAndQuery, MIN_FREQUENCY_HZ, MAX_FREQUENCY_HZ},
-    {"[SENSe] AVERage COUNt", eAverageCount, eInteger, eSetAndQuery, 1, kMaxAverageCount},
+    {"[SENSe] AVERage COUNt", eAverageCount, eInteger, eSetAndQuery, 1, MAX_AVERAGE_COUNT},
     {"[SENSe] AVERage [STATe]", eAveraging, eBoolean, eSetAndQuery, 0, 0},
     {"[SENSe] CORRection OFFSet", eOffset, eReal, eSetAndQuery, -MAX_OFFSET_DB, MAX_OFFSET_DB},
     {"UNIT POWer", eUnit, eUnitChoice, eSetAndQuery, 0, 0},
@@ -129,10 +129,10 @@ bool real(const std::string& text, EAction action, double low, double high, doub
         return false;
     std::string unit = trim(rest);
     if (action == eFrequency && !unit.empty()) {
-        const char* const kUnits[] = {"hz", "khz", "mhz", "ghz"};
+        const char* const FREQUENCY_UNITS[] = {"hz", "khz", "mhz", "ghz"};
         double scale = 1.0;
         bool known = false;
-        for (const char* name : kUnits) {
+        for (const char* name : FREQUENCY_UNITS) {
             known = known || unit == name;
             if (!known)
                 scale *= 1e3;
@@ -162,10 +162,10 @@ bool parameter(const SEntry& entry, const std::string& text, SCommand* command)
         command->nValue = text == "on" || text == "1" ? 1 : 0;
         return text == "on" || text == "1" || text == "off" || text == "0";
     case eFunctionChoice:
-        command->nValue = text == "pow" || text == "power" ? kFunctionPower : kFunctionTrace;
+        command->nValue = text == "pow" || text == "power" ? FUNCTION_POWER : FUNCTION_TRACE;
         return text == "pow" || text == "power" || text == "trac" || text == "trace";
     case eUnitChoice:
-        command->nValue = text == "dbm" ? kUnitDbm : kUnitWatt;
+        command->nValue = text == "dbm" ? UNIT_DBM : UNIT_WATT;
         return text == "dbm" || text == "w";
     }
     return false;

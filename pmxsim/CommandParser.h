@@ -39,10 +39,10 @@ enum EAction {
 };
 
 // The choices of FUNC and UNIT:POW, as nValue.
-const int32_t kFunctionPower = 0;
-const int32_t kFunctionTrace = 1;
-const int32_t kUnitDbm = 0;
-const int32_t kUnitWatt = 1;
+const int32_t FUNCTION_POWER = 0;
+const int32_t FUNCTION_TRACE = 1;
+const int32_t UNIT_DBM = 0;
+const int32_t UNIT_WATT = 1;
 
 struct SCommand {
     EAction eAction = eUnknown;

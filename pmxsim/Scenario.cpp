@@ -12,7 +12,7 @@ namespace PmxSim {
 
 namespace {
 
-const char* const kDefaultDevices = "PMX-M01:100000,PMX-M10:100001";
+const char* const DEFAULT_DEVICES = "PMX-M01:100000,PMX-M10:100001";
 const size_t MAX_SCENARIO_BYTES = 1 << 20;
 
 void complain(const std::string& text)
@@ -61,7 +61,7 @@ SScenario configuredScenario()
         return fileScenario(config);
     const char* devices = std::getenv("PMXSIM_DEVICES");
     std::vector<std::string> complaints;
-    SScenario scenario = devicesScenario(devices != nullptr ? devices : kDefaultDevices, &complaints);
+    SScenario scenario = devicesScenario(devices != nullptr ? devices : DEFAULT_DEVICES, &complaints);
     for (const std::string& complaint : complaints)
         complain("PMXSIM_DEVICES: " + complaint);
     return scenario;

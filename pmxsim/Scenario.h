@@ -73,8 +73,8 @@ struct SFault {
 };
 
 struct SScenario {
-    int32_t nAckMs = kDefaultAckMs;
-    int32_t nMeasureMs = kDefaultMeasureMs;
+    int32_t nAckMs = DEFAULT_ACK_MS;
+    int32_t nMeasureMs = DEFAULT_MEASURE_MS;
     std::vector<SSensorModel> sensors;
     std::vector<SFault> faults;
 };

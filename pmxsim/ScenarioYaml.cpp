@@ -15,7 +15,7 @@ namespace PmxSim {
 
 namespace {
 
-const int32_t kMaxDelayMs = 60000;
+const int32_t MAX_DELAY_MS = 60000;
 const size_t MAX_SEQUENCE = 100000;
 const size_t MAX_ANSWERS = 1000;
 
@@ -220,10 +220,10 @@ void readScenario(const YAML::Node& root, SScenario* scenario)
         expectMap(delays, "delays", {"acknowledge", "measurement"});
         if (delays["acknowledge"])
             scenario->nAckMs =
-                static_cast<int32_t>(whole(delays["acknowledge"], "the acknowledgement delay", 0, kMaxDelayMs));
+                static_cast<int32_t>(whole(delays["acknowledge"], "the acknowledgement delay", 0, MAX_DELAY_MS));
         if (delays["measurement"])
             scenario->nMeasureMs =
-                static_cast<int32_t>(whole(delays["measurement"], "the measurement time", 0, kMaxDelayMs));
+                static_cast<int32_t>(whole(delays["measurement"], "the measurement time", 0, MAX_DELAY_MS));
     }
     if (root["sensors"]) {
         const YAML::Node sensors = root["sensors"];

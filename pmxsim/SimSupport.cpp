@@ -12,7 +12,7 @@ namespace PmxSim {
 
 namespace {
 
-const char* const kFunctionNames[] = {"PmxOpenDriver",
+const char* const FUNCTION_NAMES[] = {"PmxOpenDriver",
                                       "PmxCloseDriver",
                                       "PmxOpenSensor",
                                       "PmxCloseSensor",
@@ -95,7 +95,7 @@ const char* errorText(int32_t code)
 
 const char* functionName(int fn)
 {
-    return kFunctionNames[fn];
+    return FUNCTION_NAMES[fn];
 }
 
 std::string lower(std::string text)

@@ -10,25 +10,25 @@
 
 namespace PmxSim {
 
-const char* const kFirmware = "1.20";
-const int32_t kDefaultAckMs = 0;
-const int32_t kDefaultMeasureMs = 10;
-const int32_t kDefaultTracePoints = 100;
-const int32_t kMaxTracePoints = 1024;
+const char* const FIRMWARE_VERSION = "1.20";
+const int32_t DEFAULT_ACK_MS = 0;
+const int32_t DEFAULT_MEASURE_MS = 10;
+const int32_t DEFAULT_TRACE_POINTS = 100;
+const int32_t MAX_TRACE_POINTS = 1024;
 const double DEFAULT_FREQUENCY_HZ = 1e9;
 const double MIN_FREQUENCY_HZ = 10e6;
 const double MAX_FREQUENCY_HZ = 40e9;
-const int32_t kMaxAverageCount = 1024;
+const int32_t MAX_AVERAGE_COUNT = 1024;
 const double MAX_OFFSET_DB = 100.0;
 const size_t MAX_PENDING = 1024;                     // oldest results are dropped beyond this
-const int32_t kMaxQueuedCount = 1 << 20;             // elements of one queued result
+const int32_t MAX_QUEUED_COUNT = 1 << 20;            // elements of one queued result
 const size_t MAX_TEXT = 255;                         // device-info buffers hold 256 bytes
-const int64_t kFirstHandle = (int64_t(1) << 32) + 1; // handles do not fit 32 bits on purpose
+const int64_t FIRST_HANDLE = (int64_t(1) << 32) + 1; // handles do not fit 32 bits on purpose
 
 // Trigger states that PmxGetTriggerState reports and the state-changed callback passes.
-const int32_t kStateIdle = 0;
-const int32_t kStateWaitingForTrigger = 2;
-const int32_t kStateMeasuring = 3;
+const int32_t TRIGGER_STATE_IDLE = 0;
+const int32_t TRIGGER_STATE_WAITING = 2;
+const int32_t TRIGGER_STATE_MEASURING = 3;
 
 const int FUNCTION_COUNT = 24; // library functions (EFunction)
 

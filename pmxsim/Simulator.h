@@ -119,7 +119,7 @@ private:
     // What *RST restores: the measurement function and the settings that shape a result.
     struct SSettings {
         bool bTrace = false;
-        int32_t nTracePoints = kDefaultTracePoints;
+        int32_t nTracePoints = DEFAULT_TRACE_POINTS;
         double dFrequencyHz = DEFAULT_FREQUENCY_HZ;
         bool bAveraging = false;
         int32_t nAverageCount = 1;

@@ -134,7 +134,7 @@ int32_t CSimulator::setDeviceFlag(const char* serial, int32_t flag)
 int32_t CSimulator::queueResult(const char* serial, int32_t dataType, const void* values, int32_t count)
 {
     CLock lock(*this);
-    if (dataType < 0 || dataType > PMXSIM_TYPE_LAST || count < 0 || count > kMaxQueuedCount ||
+    if (dataType < 0 || dataType > PMXSIM_TYPE_LAST || count < 0 || count > MAX_QUEUED_COUNT ||
         (count > 0 && values == nullptr))
         return PMXSIM_E_INVALID_ARGUMENT;
     int32_t code;

@@ -33,7 +33,7 @@ CSimulator& CSimulator::instance()
 CSimulator::CSimulator()
 {
     CLock lock(*this);
-    m_nNextHandle = kFirstHandle;
+    m_nNextHandle = FIRST_HANDLE;
     m_aRandom.seed(12345);
     loadDefaultsLocked();
 }

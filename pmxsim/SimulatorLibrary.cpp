@@ -52,7 +52,7 @@ int32_t CSimulator::openSensor(const char* descriptor, int64_t* handle)
         return PMXSIM_E_SENSOR_IN_USE;
 
     sensor->nHandle = m_nNextHandle++;
-    sensor->nTriggerState = kStateIdle;
+    sensor->nTriggerState = TRIGGER_STATE_IDLE;
     sensor->bMeasuring = false;
     sensor->bContinuous = false;
     sensor->settings = SSettings();
@@ -82,7 +82,7 @@ int32_t CSimulator::closeSensor(int64_t handle)
     m_aOpen.erase(it);
     abortMeasurement(*sensor);
     sensor->results.clear();
-    sensor->nTriggerState = kStateIdle;
+    sensor->nTriggerState = TRIGGER_STATE_IDLE;
     sensor->nHandle = 0;
     return PMX_SUCCESS;
 }

@@ -16,10 +16,10 @@ namespace {
 const float POWER_DBM = -20.0f;          // level of a measurement and of a pulse top
 const float FLOOR_DBM = -60.0f;          // level outside the pulse of a trace
 const double RESPONSE_DB_PER_GHZ = -0.2; // level change per GHz away from 1 GHz
-const char* const kScpiVersion = "1999.0";
+const char* const SCPI_VERSION = "1999.0";
 // Bits of the event status register.
-const int32_t kEventOperationComplete = 1;
-const int32_t kEventCommandError = 32;
+const int32_t EVENT_OPERATION_COMPLETE = 1;
+const int32_t EVENT_COMMAND_ERROR = 32;
 
 std::string number(double value)
 {
@@ -47,7 +47,7 @@ void CSimulator::abortMeasurement(SSensor& sensor)
     if (sensor.bMeasuring) {
         sensor.bMeasuring = false;
         ++sensor.nMeasurement;
-        setState(sensor, kStateIdle);
+        setState(sensor, TRIGGER_STATE_IDLE);
     }
 }
 
@@ -56,8 +56,8 @@ void CSimulator::startMeasurement(SSensor& sensor, bool trace, Clock::time_point
     sensor.bMeasuring = true;
     sensor.bMeasuringTrace = trace;
     ++sensor.nMeasurement;
-    setState(sensor, kStateWaitingForTrigger);
-    setState(sensor, kStateMeasuring);
+    setState(sensor, TRIGGER_STATE_WAITING);
+    setState(sensor, TRIGGER_STATE_MEASURING);
     // A continuous measurement takes at least 1 ms so that it cannot saturate the callback thread.
     int32_t duration = sensor.bContinuous ? std::max(m_nMeasureMs, 1) : m_nMeasureMs;
     STask task{STask::eMeasurementDone, m_aOpen.at(sensor.nHandle), sensor.nHandle, std::string(), sensor.nMeasurement};
@@ -145,7 +145,7 @@ void CSimulator::finishMeasurement(SSensor& sensor, Clock::time_point now)
         startMeasurement(sensor, sensor.settings.bTrace, now);
     } else {
         sensor.bMeasuring = false;
-        setState(sensor, kStateIdle);
+        setState(sensor, TRIGGER_STATE_IDLE);
     }
 }
 
@@ -174,7 +174,7 @@ void CSimulator::runCommand(SSensor& sensor, const std::string& text, Clock::tim
     // is not running, is harmless and answered with the benign notice.
     bool ignored = (starts && sensor.bMeasuring) || (stopsContinuous && !sensor.bContinuous);
     if (command.eAction == eUnknown) {
-        sensor.nEventStatus |= kEventCommandError;
+        sensor.nEventStatus |= EVENT_COMMAND_ERROR;
         post(eErrorOccurred, sensor.nHandle, PMX_ERR_UNKNOWN_COMMAND);
     }
     if (ignored)
@@ -190,7 +190,7 @@ void CSimulator::applyCommand(SSensor& sensor, const SCommand& command, Clock::t
 {
     switch (command.eAction) {
     case eIdn:
-        addText(sensor, "Marlowe&Tenby," + sensor.strType + "," + sensor.strSerial + "," + kFirmware);
+        addText(sensor, "Marlowe&Tenby," + sensor.strType + "," + sensor.strSerial + "," + FIRMWARE_VERSION);
         break;
     case eReset:
         abortMeasurement(sensor);
@@ -257,7 +257,7 @@ void CSimulator::applyStatusCommand(SSensor& sensor, const SCommand& command)
         if (command.bQuery)
             addText(sensor, "1");
         else
-            sensor.nEventStatus |= kEventOperationComplete;
+            sensor.nEventStatus |= EVENT_OPERATION_COMPLETE;
         break;
     case eEventStatus: // reading the register clears it
         addText(sensor, std::to_string(sensor.nEventStatus));
@@ -274,7 +274,7 @@ void CSimulator::applyStatusCommand(SSensor& sensor, const SCommand& command)
         addText(sensor, "0");
         break;
     case eVersion:
-        addText(sensor, kScpiVersion);
+        addText(sensor, SCPI_VERSION);
         break;
     default:
         break;
@@ -291,7 +291,7 @@ void CSimulator::applySetting(SSensor& sensor, const SCommand& command)
         if (query)
             addText(sensor, settings.bTrace ? "TRACE" : "POWER");
         else
-            settings.bTrace = command.nValue == kFunctionTrace;
+            settings.bTrace = command.nValue == FUNCTION_TRACE;
         break;
     case eTracePoints:
         if (query)
@@ -327,7 +327,7 @@ void CSimulator::applySetting(SSensor& sensor, const SCommand& command)
         if (query)
             addText(sensor, settings.bWatt ? "W" : "DBM");
         else
-            settings.bWatt = command.nValue == kUnitWatt;
+            settings.bWatt = command.nValue == UNIT_WATT;
         break;
     default:
         break;
@@ -345,7 +345,7 @@ bool CSimulator::answerFromModel(SSensor& sensor, const std::string& text)
         if (!matchesPattern(answer.strPattern.c_str(), command.c_str()))
             continue;
         if (answer.bError) {
-            sensor.nEventStatus |= kEventCommandError;
+            sensor.nEventStatus |= EVENT_COMMAND_ERROR;
             post(eErrorOccurred, sensor.nHandle, answer.nCode);
         }
         ++sensor.nCommandCount;

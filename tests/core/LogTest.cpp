@@ -82,7 +82,8 @@ namespace {
 // <date> <H:MM:SS> [LEVEL] logger - text. The date follows the system locale's short form; a
 // locale whose time picture has a marker (en-US "h:mm:ss tt") keeps it after the forced
 // 24-hour time on Windows, e.g. "19:12:53 PM".
-const char* const kHead = R"(^[0-9]{1,4}[./-][0-9]{1,2}[./-][0-9]{1,4} ([0-9]{1,2}):[0-5][0-9]:[0-5][0-9](?: [AP]M)? )";
+const char* const LOG_LINE_HEAD =
+    R"(^[0-9]{1,4}[./-][0-9]{1,2}[./-][0-9]{1,4} ([0-9]{1,2}):[0-5][0-9]:[0-5][0-9](?: [AP]M)? )";
 
 std::string tempPath(const std::string& name)
 {
@@ -127,7 +128,7 @@ TEST_F(CLogTest, LineCarriesDateTimeLevelLoggerAndPieces)
     std::vector<std::string> lines = m_cCapture.lines();
     ASSERT_EQ(1u, lines.size());
     std::smatch match;
-    std::regex line(std::string(kHead) +
+    std::regex line(std::string(LOG_LINE_HEAD) +
                     R"(\[WARN \] CTestLogger - LbCore::CTest::op - value 42 7 18446744073709551615$)");
     ASSERT_TRUE(std::regex_search(lines[0], match, line)) << lines[0];
     int hour = std::stoi(match[1].str()); // a 24-hour clock: the hour is the local tm_hour
@@ -146,7 +147,8 @@ TEST_F(CLogTest, LevelTextIsAlwaysFiveCharacters)
     std::vector<std::string> lines = m_cCapture.lines();
     ASSERT_EQ(5u, lines.size());
     for (int i = 0; i < 5; ++i) {
-        EXPECT_TRUE(std::regex_search(lines[i], std::regex(std::string(kHead) + "\\" + expected[i] + "$"))) << lines[i];
+        EXPECT_TRUE(std::regex_search(lines[i], std::regex(std::string(LOG_LINE_HEAD) + "\\" + expected[i] + "$")))
+            << lines[i];
     }
 }
 
@@ -225,9 +227,11 @@ TEST_F(CLogTest, FileAppenderAppendsToExistingContent)
     std::vector<std::string> lines = readLines(path);
     ASSERT_EQ(3u, lines.size());
     EXPECT_EQ("line of an earlier run", lines[0]);
-    EXPECT_TRUE(std::regex_search(lines[1], std::regex(std::string(kHead) + R"(\[INFO \] CTestLogger - first$)")))
+    EXPECT_TRUE(
+        std::regex_search(lines[1], std::regex(std::string(LOG_LINE_HEAD) + R"(\[INFO \] CTestLogger - first$)")))
         << lines[1];
-    EXPECT_TRUE(std::regex_search(lines[2], std::regex(std::string(kHead) + R"(\[INFO \] CTestLogger - second$)")))
+    EXPECT_TRUE(
+        std::regex_search(lines[2], std::regex(std::string(LOG_LINE_HEAD) + R"(\[INFO \] CTestLogger - second$)")))
         << lines[2];
     std::remove(path.c_str());
 }
@@ -264,7 +268,7 @@ TEST_F(CLogTest, TwoThreadsWriteWholeLines)
     }
     std::vector<std::string> lines = readLines(path);
     ASSERT_EQ(2u * LINES, lines.size());
-    std::regex whole(std::string(kHead) +
+    std::regex whole(std::string(LOG_LINE_HEAD) +
                      R"(\[INFO \] (CWriter[AB]) - LbCore::CTest::write - line [0-9]+ of (CWriter[AB])$)");
     for (const std::string& line : lines) {
         std::smatch match;
@@ -353,7 +357,7 @@ TEST_F(CLogTest, OutputIsTheSameAtEveryLevelWithAndWithoutAFile)
         ASSERT_EQ(withoutFile.size(), withFile.size());
         std::string expectedFile;
         for (std::size_t i = 0; i < withFile.size(); ++i) {
-            std::regex line(std::string(kHead) + "\\" + tails[level + i] + "$");
+            std::regex line(std::string(LOG_LINE_HEAD) + "\\" + tails[level + i] + "$");
             EXPECT_TRUE(std::regex_search(withoutFile[i], line)) << withoutFile[i];
             EXPECT_TRUE(std::regex_search(withFile[i], line)) << withFile[i];
             expectedFile += withFile[i] + "\n";

@@ -37,9 +37,9 @@ extern "C" __attribute__((visibility("default"))) ViStatus viSvc56(ViSession vi,
 namespace LbPassportTest {
 
 namespace {
-const char* const kFirst = "LBPMX::0x0003::100000::INSTR";
-const char* const kSecond = "LBPMX::0x009a::100001::INSTR";
-const std::int32_t kFault = static_cast<std::int32_t>(0xD0000042u);
+const char* const FIRST_RESOURCE = "LBPMX::0x0003::100000::INSTR";
+const char* const SECOND_RESOURCE = "LBPMX::0x009a::100001::INSTR";
+const std::int32_t SENSOR_FAULT = static_cast<std::int32_t>(0xD0000042u);
 
 bool driverOpen()
 {
@@ -67,7 +67,7 @@ TEST_F(Lifecycle, FindSkipsASensorWhoseInformationCannotBeRead)
     ViChar name[VI_FIND_BUFLEN] = {0};
     ASSERT_EQ(VI_SUCCESS, viFindRsrc(m_nRm, "?*::INSTR", &list, &count, name));
     EXPECT_EQ(1u, count);
-    EXPECT_STREQ(kSecond, name);
+    EXPECT_STREQ(SECOND_RESOURCE, name);
     viClose(list);
     EXPECT_TRUE(logContains("[WARN ] CPmxSessionDispatcher - LbPmxVisa::CPmxSessionDispatcher::getAvailableDevices - "
                             "Skipping device 0, its information could not be read: Sensor has been detached"));
@@ -79,32 +79,32 @@ TEST_F(Lifecycle, LibraryFaultsAtDriverAndSensorOpenAndCloseRecover)
     // Without a callback the session would never hear anything: the open fails.
     ViSession session = VI_NULL;
     for (const char* registration : {"PmxSetNotifyCallbackCommandAccepted", "PmxSetNotifyCallbackDataAvailable"}) {
-        ASSERT_EQ(0, PmxSimFailNext(registration, kFault));
-        EXPECT_EQ(VI_ERROR_RSRC_NFOUND, viOpen(m_nRm, kFirst, VI_NULL, 0, &session));
+        ASSERT_EQ(0, PmxSimFailNext(registration, SENSOR_FAULT));
+        EXPECT_EQ(VI_ERROR_RSRC_NFOUND, viOpen(m_nRm, FIRST_RESOURCE, VI_NULL, 0, &session));
         EXPECT_FALSE(driverOpen());
     }
 
     // A driver that would not close, at the last close or at the end of a discovery.
-    session = open(kFirst);
-    ASSERT_EQ(0, PmxSimFailNext("PmxCloseDriver", kFault));
+    session = open(FIRST_RESOURCE);
+    ASSERT_EQ(0, PmxSimFailNext("PmxCloseDriver", SENSOR_FAULT));
     viClose(session);
-    session = open(kFirst);
+    session = open(FIRST_RESOURCE);
     expectWorking(session);
     viClose(session);
     ViFindList list = VI_NULL;
     ViUInt32 count = 0;
     ViChar name[VI_FIND_BUFLEN] = {0};
-    ASSERT_EQ(0, PmxSimFailNext("PmxCloseDriver", kFault));
+    ASSERT_EQ(0, PmxSimFailNext("PmxCloseDriver", SENSOR_FAULT));
     viFindRsrc(m_nRm, "?*::INSTR", &list, &count, name);
     viClose(list);
-    session = open(kFirst);
+    session = open(FIRST_RESOURCE);
     expectWorking(session);
 
     // A sensor that would not close while another one keeps the driver open.
-    ViSession second = open(kSecond);
-    ASSERT_EQ(0, PmxSimFailNext("PmxCloseSensor", kFault));
+    ViSession second = open(SECOND_RESOURCE);
+    ASSERT_EQ(0, PmxSimFailNext("PmxCloseSensor", SENSOR_FAULT));
     viClose(session);
-    session = open(kFirst);
+    session = open(FIRST_RESOURCE);
     expectWorking(session);
     viClose(session);
     viClose(second);
@@ -116,12 +116,12 @@ TEST_F(Lifecycle, AFailedOpenLeavesNoSensorSessionBehind)
 {
     ViSession session = VI_NULL;
     s_nFailInstall = VI_ERROR_INV_SETUP;
-    EXPECT_EQ(VI_ERROR_INV_SETUP, viOpen(m_nRm, kFirst, VI_NULL, 0, &session));
+    EXPECT_EQ(VI_ERROR_INV_SETUP, viOpen(m_nRm, FIRST_RESOURCE, VI_NULL, 0, &session));
     EXPECT_FALSE(driverOpen()) << "the new sensor session was released and the driver closed";
 
     // Without its record the session could never be closed: the open fails before anything opens.
     s_nFailRecord = 1;
-    EXPECT_EQ(VI_ERROR_SYSTEM_ERROR, viOpen(m_nRm, kFirst, VI_NULL, 0, &session));
+    EXPECT_EQ(VI_ERROR_SYSTEM_ERROR, viOpen(m_nRm, FIRST_RESOURCE, VI_NULL, 0, &session));
     EXPECT_FALSE(driverOpen());
     EXPECT_TRUE(logContains(
         "[ERROR] CLbPmxInstrSesn - LbPmxPassport::CLbPmxInstrSesn::viOpen - No session record for session "));

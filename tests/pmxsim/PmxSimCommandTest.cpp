@@ -85,11 +85,11 @@ TEST_F(PmxSimTest, UnknownAndIgnoredCommandsReportErrorsBeforeTheAcknowledgement
 TEST_F(PmxSimTest, PowerMeterSettingsAnswerTheirQueriesAndRefuseBadParameters)
 {
     int64_t handle = open();
-    const char* const kAnswers[][2] = {{"freq?", "1e+09"},    {"aver?", "0"},       {"sens:aver:coun?", "1"},
-                                       {"corr:offs?", "0"},   {"unit:pow?", "DBM"}, {"func?", "POWER"},
-                                       {"trac:poin?", "100"}, {"init:cont?", "0"},  {"*ese?", "0"},
-                                       {"*opc?", "1"},        {"*tst?", "0"},       {"syst:vers?", "1999.0"}};
-    for (const auto& pair : kAnswers)
+    const char* const DEFAULT_ANSWERS[][2] = {{"freq?", "1e+09"},    {"aver?", "0"},       {"sens:aver:coun?", "1"},
+                                              {"corr:offs?", "0"},   {"unit:pow?", "DBM"}, {"func?", "POWER"},
+                                              {"trac:poin?", "100"}, {"init:cont?", "0"},  {"*ese?", "0"},
+                                              {"*opc?", "1"},        {"*tst?", "0"},       {"syst:vers?", "1999.0"}};
+    for (const auto& pair : DEFAULT_ANSWERS)
         EXPECT_EQ(pair[1], ask(handle, pair[0]));
     command(handle, "SENSe:FREQuency 2.5 GHz");
     command(handle, ":sens:aver:stat on");
@@ -97,24 +97,24 @@ TEST_F(PmxSimTest, PowerMeterSettingsAnswerTheirQueriesAndRefuseBadParameters)
     command(handle, "CORR:OFFS -3.25");
     command(handle, "unit:pow w");
     command(handle, "*ese 36");
-    const char* const kChanged[][2] = {{"sens:freq?", "2.5e+09"}, {"aver:stat?", "1"}, {"aver:coun?", "16"},
-                                       {"corr:offs?", "-3.25"},   {"unit:pow?", "W"},  {"*ese?", "36"}};
-    for (const auto& pair : kChanged)
+    const char* const CHANGED_ANSWERS[][2] = {{"sens:freq?", "2.5e+09"}, {"aver:stat?", "1"}, {"aver:coun?", "16"},
+                                              {"corr:offs?", "-3.25"},   {"unit:pow?", "W"},  {"*ese?", "36"}};
+    for (const auto& pair : CHANGED_ANSWERS)
         EXPECT_EQ(pair[1], ask(handle, pair[0]));
     command(handle, "*rst");
     EXPECT_EQ("1e+09", ask(handle, "freq?"));
     EXPECT_EQ("36", ask(handle, "*ese?")) << "*RST keeps the status enables";
 
     m_aRecorder.clear();
-    const char* const kBad[] = {"freq 5",        "freq 1 thz",   "aver:coun 0", "aver maybe",
-                                "corr:offs 101", "unit:pow dbw", "*ese 256",    "freq? 1",
-                                "read",          "*idn",         "meas:volt?",  "trac:poin 1025"};
-    for (const char* bad : kBad)
+    const char* const BAD_COMMANDS[] = {"freq 5",        "freq 1 thz",   "aver:coun 0", "aver maybe",
+                                        "corr:offs 101", "unit:pow dbw", "*ese 256",    "freq? 1",
+                                        "read",          "*idn",         "meas:volt?",  "trac:poin 1025"};
+    for (const char* bad : BAD_COMMANDS)
         command(handle, bad);
     size_t refused = 0;
     for (const SCall& c : m_aRecorder.calls())
         refused += c.kind == eError && c.value == PMX_ERR_UNKNOWN_COMMAND ? 1 : 0;
-    EXPECT_EQ(sizeof kBad / sizeof kBad[0], refused);
+    EXPECT_EQ(sizeof BAD_COMMANDS / sizeof BAD_COMMANDS[0], refused);
     // A refused command sets the command-error bit; reading the register clears it.
     EXPECT_EQ("32", ask(handle, "*esr?"));
     command(handle, "*opc");

@@ -61,7 +61,7 @@ protected:
 
 #ifdef PMXSIM_HAVE_YAML
 
-const char* const kScenario = R"(
+const char* const SCENARIO_TEXT = R"(
 sensors:
   - {type: PMX-M01, serial: "100000", power: [-10, -11.5]}
   - type: PMX-M02
@@ -80,7 +80,7 @@ faults:
 
 TEST_F(ScenarioTest, FileDescribesSensorsMeasurementsAnswersAndFaults)
 {
-    ASSERT_EQ("", load(kScenario));
+    ASSERT_EQ("", load(SCENARIO_TEXT));
     ASSERT_EQ(2, sensors());
     char name[256], type[256], serial[256];
     int32_t flag = -1;
@@ -116,14 +116,14 @@ TEST_F(ScenarioTest, FileDescribesSensorsMeasurementsAnswersAndFaults)
     EXPECT_EQ(1, sensors());
 
     // A reload starts the same way again: the noise repeats with its seed.
-    load(kScenario);
+    load(SCENARIO_TEXT);
     second = open("USB::0x0c6f::0004::ab7");
     EXPECT_EQ(noisy, measure(second, "meas?"));
 }
 
 TEST_F(ScenarioTest, MalformedFileLeavesNoSensorAndNamesLineAndReason)
 {
-    const char* const kBad[][2] = {
+    const char* const BAD_SCENARIOS[][2] = {
         {"sensors: [", "pmxsim_scenario.yaml:1: end of sequence flow not found"},
         {"sensors:\n  - {type: PMX, serial: 1, colour: red}", ":2: unknown key \"colour\" in a sensor"},
         {"sensors:\n  - {type: PMX}", ":2: a sensor needs a type and a serial"},
@@ -143,7 +143,7 @@ TEST_F(ScenarioTest, MalformedFileLeavesNoSensorAndNamesLineAndReason)
         {"faults:\n  - {function: PmxGetData, code: 0}", ":2: the fault code must not be 0"},
         {"- just a list", ":1: the scenario must be a mapping"},
     };
-    for (const auto& bad : kBad) {
+    for (const auto& bad : BAD_SCENARIOS) {
         SCOPED_TRACE(bad[0]);
         std::string complaint = load(bad[0]);
         EXPECT_NE(std::string::npos, complaint.find(bad[1])) << complaint;

@@ -22,7 +22,7 @@ const CAccessor STATES[] = {
     &CIPmxSessionState::opStatusToNoData,
     &CIPmxSessionState::opStatusToPmxDataAvailable,
 };
-const char* const kNames[] = {
+const char* const STATE_NAMES[] = {
     "NoData",
     "WaitingForData",
     "DataAvailable",
@@ -33,7 +33,7 @@ const char* const kNames[] = {
 };
 const int R = -1; // refused
 // Successor by current state (rows) and requested target (columns), in the order above.
-const int kTable[7][7] = {
+const int TRANSITION_TABLE[7][7] = {
     {0, 1, 2, 3, R, 5, R}, {0, R, 2, R, R, R, R}, {0, R, 2, 4, R, 6, R}, {0, R, 4, 3, R, R, R},
     {2, R, R, 4, 4, R, R}, {0, R, 6, R, R, 5, R}, {2, R, R, R, R, 6, R},
 };
@@ -43,7 +43,7 @@ protected:
     const CIPmxSessionState* state() { return session().getState(); }
     void reportError(std::int32_t code)
     {
-        ASSERT_EQ(0, PmxSimReportError(LbTests::kSerial, code));
+        ASSERT_EQ(0, PmxSimReportError(LbTests::SENSOR_SERIAL, code));
         ASSERT_TRUE(m_cListener.waitErrors(++m_nErrors));
     }
     int m_nErrors = 0;
@@ -54,22 +54,22 @@ protected:
 TEST_F(SessionState, EveryTransitionOfTheTable)
 {
     for (int current = 0; current < 7; ++current) {
-        EXPECT_EQ(kNames[current], STATES[current]()->getName());
+        EXPECT_EQ(STATE_NAMES[current], STATES[current]()->getName());
         for (int target = 0; target < 7; ++target) {
             const CIPmxSessionState* from = STATES[current]();
             const CIPmxSessionState* to = STATES[target]();
-            SCOPED_TRACE(std::string(kNames[current]) + " -> " + kNames[target]);
-            if (kTable[current][target] == R) {
+            SCOPED_TRACE(std::string(STATE_NAMES[current]) + " -> " + STATE_NAMES[target]);
+            if (TRANSITION_TABLE[current][target] == R) {
                 try {
                     from->nextState(session(), to);
                     ADD_FAILURE() << "accepted";
                 } catch (const CIPmxSessionState::CPmxInvalidStateException& e) {
-                    EXPECT_EQ(std::string("Can't change state from ") + kNames[current] + " into state " +
-                                  kNames[target],
+                    EXPECT_EQ(std::string("Can't change state from ") + STATE_NAMES[current] + " into state " +
+                                  STATE_NAMES[target],
                               e.what());
                 }
             } else {
-                EXPECT_EQ(STATES[kTable[current][target]](), from->nextState(session(), to));
+                EXPECT_EQ(STATES[TRANSITION_TABLE[current][target]](), from->nextState(session(), to));
             }
             // Only WaitingForData -> DataAvailable hands a count to a waiting reader, once.
             EXPECT_EQ(current == 1 && target == 2, session().getDataSemaphore().wait(0));
@@ -141,16 +141,16 @@ TEST_F(SessionState, AFailedFetchFailsTheReadWithItsCode)
 TEST_F(SessionState, StatusQueryWhileAResultIsPendingIsAnsweredFirst)
 {
     queueFloats(6, {1.0f});
-    ASSERT_EQ(0, PmxSimSetTriggerState(LbTests::kSerial, 3));
+    ASSERT_EQ(0, PmxSimSetTriggerState(LbTests::SENSOR_SERIAL, 3));
     session().write("STATus:OPERation:CONDition?");
     EXPECT_EQ(CIPmxSessionState::opStatusToPmxDataAvailable(), state());
     EXPECT_EQ("16", read());
     EXPECT_EQ(CIPmxSessionState::dataAvailable(), state());
     EXPECT_EQ("1.000000e+000", read());
-    ASSERT_EQ(0, PmxSimSetTriggerState(LbTests::kSerial, 2));
+    ASSERT_EQ(0, PmxSimSetTriggerState(LbTests::SENSOR_SERIAL, 2));
     session().write("stat:oper:cond?");
     EXPECT_EQ("32", read());
-    ASSERT_EQ(0, PmxSimSetTriggerState(LbTests::kSerial, 1));
+    ASSERT_EQ(0, PmxSimSetTriggerState(LbTests::SENSOR_SERIAL, 1));
     session().write("stat:oper:cond?");
     EXPECT_EQ("0", read());
 }

@@ -20,8 +20,8 @@ using LbPmxVisa::CPmxResourceInfo;
 using LbPmxVisa::CPmxSession;
 using LbPmxVisa::CPmxSessionDispatcher;
 using LbTests::CLogCapture;
-using LbTests::kResource;
-using LbTests::kSerial;
+using LbTests::SENSOR_RESOURCE;
+using LbTests::SENSOR_SERIAL;
 
 namespace {
 
@@ -115,7 +115,7 @@ TEST_F(SessionTest, SensorErrorFailsTheWaitingWriteAfterItsAcknowledgementAndIsQ
     std::int32_t failure = 0;
     std::thread writer = writeAndFail("*RST", failure);
     ASSERT_TRUE(capture.waitFor("Execute PmxSendCommand(...) [*rst]"));
-    ASSERT_EQ(0, PmxSimReportError(kSerial, code));
+    ASSERT_EQ(0, PmxSimReportError(SENSOR_SERIAL, code));
     ASSERT_TRUE(m_cListener.waitErrors(1));
     CPmxEvent accepted = {session.getHandle(), 1};
     dispatcher().notifyCommandAcceptedEvent(accepted);
@@ -131,7 +131,7 @@ TEST_F(SessionTest, SensorErrorFailsTheWaitingWriteAfterItsAcknowledgementAndIsQ
     writer = writeAndFail("*CLS", second);
     ASSERT_TRUE(capture.waitFor("Execute PmxSendCommand(...) [*cls]"));
     session.setTimeout(50);
-    ASSERT_EQ(0, PmxSimReportError(kSerial, code));
+    ASSERT_EQ(0, PmxSimReportError(SENSOR_SERIAL, code));
     writer.join();
     EXPECT_EQ(code, second);
     EXPECT_EQ(2u, session.getCommandCount());
@@ -214,20 +214,20 @@ TEST_F(SessionTest, StatusByteCombinesErrorQueueResultAndTriggerState)
     CPmxSession& session = open();
     EXPECT_EQ(0, statusByte());
 
-    ASSERT_EQ(0, PmxSimReportError(kSerial, codeOf(PMXSIM_E_INVALID_HANDLE)));
+    ASSERT_EQ(0, PmxSimReportError(SENSOR_SERIAL, codeOf(PMXSIM_E_INVALID_HANDLE)));
     ASSERT_TRUE(m_cListener.waitErrors(1));
     EXPECT_EQ(4, statusByte());
 
     float value = -20.0f;
-    ASSERT_EQ(0, PmxSimQueueResult(kSerial, 6, &value, 1));
+    ASSERT_EQ(0, PmxSimQueueResult(SENSOR_SERIAL, 6, &value, 1));
     ASSERT_TRUE(m_cListener.waitData(1));
     EXPECT_EQ(4 + 16, statusByte());
 
-    ASSERT_EQ(0, PmxSimSetTriggerState(kSerial, 3));
+    ASSERT_EQ(0, PmxSimSetTriggerState(SENSOR_SERIAL, 3));
     EXPECT_EQ(148, statusByte());
-    ASSERT_EQ(0, PmxSimSetTriggerState(kSerial, 2));
+    ASSERT_EQ(0, PmxSimSetTriggerState(SENSOR_SERIAL, 2));
     EXPECT_EQ(148, statusByte());
-    ASSERT_EQ(0, PmxSimSetTriggerState(kSerial, 1));
+    ASSERT_EQ(0, PmxSimSetTriggerState(SENSOR_SERIAL, 1));
     EXPECT_EQ(20, statusByte());
 
     // A device clear leaves the error queue as it is.
@@ -247,8 +247,8 @@ TEST_F(SessionTest, ErrorQueueAnswersLastRecordedFirstThenNoError)
     EXPECT_EQ("0, \"No Error\"", read());
     EXPECT_EQ(session.getState(), CIPmxSessionState::noData());
 
-    ASSERT_EQ(0, PmxSimReportError(kSerial, codeOf(PMXSIM_E_NO_SUCH_SENSOR)));
-    ASSERT_EQ(0, PmxSimReportError(kSerial, LbPmxVisa::PMX_NO_FURTHER_RESULT));
+    ASSERT_EQ(0, PmxSimReportError(SENSOR_SERIAL, codeOf(PMXSIM_E_NO_SUCH_SENSOR)));
+    ASSERT_EQ(0, PmxSimReportError(SENSOR_SERIAL, LbPmxVisa::PMX_NO_FURTHER_RESULT));
     ASSERT_TRUE(m_cListener.waitErrors(2));
     EXPECT_EQ(4, statusByte());
 
@@ -262,7 +262,7 @@ TEST_F(SessionTest, ErrorQueueAnswersLastRecordedFirstThenNoError)
 
     // A reply that does not fit is kept whole for the next read, once; the status byte
     // announces it as an answer waiting.
-    ASSERT_EQ(0, PmxSimReportError(kSerial, codeOf(PMXSIM_E_NO_SUCH_SENSOR)));
+    ASSERT_EQ(0, PmxSimReportError(SENSOR_SERIAL, codeOf(PMXSIM_E_NO_SUCH_SENSOR)));
     ASSERT_TRUE(m_cListener.waitErrors(3));
     session.write("SYST:ERR?");
     EXPECT_THROW(read(10), CPmxDataBuffer::CPmxDataBufferOverFlowException);
@@ -282,7 +282,7 @@ TEST_F(SessionTest, TwoSpellingsOfOneResourceShareOneSession)
     EXPECT_FALSE(control().isDriverOpen());
     boost::shared_ptr<CPmxSession> first = dispatcher().getSession(CPmxResourceInfo("LbPmx::3::100000"));
     EXPECT_TRUE(control().isDriverOpen());
-    boost::shared_ptr<CPmxSession> second = dispatcher().getSession(CPmxResourceInfo(kResource));
+    boost::shared_ptr<CPmxSession> second = dispatcher().getSession(CPmxResourceInfo(SENSOR_RESOURCE));
     EXPECT_EQ(first.get(), second.get());
     EXPECT_EQ(1u, dispatcher().getActiveSessionCount());
     EXPECT_EQ(1u, capture.count(" - Open session"));
@@ -299,7 +299,7 @@ TEST_F(SessionTest, TwoSpellingsOfOneResourceShareOneSession)
     EXPECT_EQ(1u, capture.count(" - Session closed successfully"));
 
     // After the last reference has gone, the resource gets a new session.
-    boost::shared_ptr<CPmxSession> third = dispatcher().getSession(CPmxResourceInfo(kResource));
+    boost::shared_ptr<CPmxSession> third = dispatcher().getSession(CPmxResourceInfo(SENSOR_RESOURCE));
     EXPECT_EQ(2u, capture.count(" - Open session"));
 }
 
@@ -335,7 +335,7 @@ TEST_F(SessionTest, EnumerationSkipsUnknownTypesAndClearedFlags)
     ASSERT_EQ(0, PmxSimSetDeviceFlag("100001", 0));
     std::vector<CPmxResourceInfo> devices = dispatcher().getAvailableDevices();
     ASSERT_EQ(1u, devices.size());
-    EXPECT_EQ(CPmxResourceInfo(kResource), devices[0]);
+    EXPECT_EQ(CPmxResourceInfo(SENSOR_RESOURCE), devices[0]);
     EXPECT_EQ(1u, capture.count("Found 3 device(s)..."));
     EXPECT_EQ(1u, capture.count("Adding device PMX-M10;100001"));
     EXPECT_EQ(1u, capture.count("Adding device NO-SUCH-TYPE;200000"));
@@ -371,7 +371,7 @@ TEST_F(SessionTest, WithoutCommandsInterfaceNothingReachesTheLibrary)
     CPmxSessionDispatcher::CPmxCommandException failure(LbPmxVisa::PMX_UNKNOWN_COMMAND);
     EXPECT_STREQ("", failure.what());
     try {
-        dispatcher().getSession(CPmxResourceInfo(kResource));
+        dispatcher().getSession(CPmxResourceInfo(SENSOR_RESOURCE));
         FAIL() << "a session without commands interface";
     } catch (const std::runtime_error& e) {
         EXPECT_STREQ("No configuration has been set. Use method attach(...) for set a configuration", e.what());

@@ -26,8 +26,8 @@
 
 namespace LbTests {
 
-const char* const kResource = "LBPMX::0x0003::100000::INSTR";
-const char* const kSerial = "100000";
+const char* const SENSOR_RESOURCE = "LBPMX::0x0003::100000::INSTR";
+const char* const SENSOR_SERIAL = "100000";
 
 class CDataListener : public LbPmxVisa::CIPmxEventListener {
 public:
@@ -86,7 +86,7 @@ protected:
     // Opens the session on the default sensor and subscribes the listener.
     LbPmxVisa::CPmxSession& open()
     {
-        m_pSession = dispatcher().getSession(LbPmxVisa::CPmxResourceInfo(kResource));
+        m_pSession = dispatcher().getSession(LbPmxVisa::CPmxResourceInfo(SENSOR_RESOURCE));
         EXPECT_TRUE(m_pSession->getEventDispatcher().addListener(&m_cListener));
         return *m_pSession;
     }
@@ -106,7 +106,7 @@ protected:
     // Queues one result and waits until the session has heard of it.
     void queue(std::int32_t type, const void* values, std::int32_t count)
     {
-        ASSERT_EQ(0, PmxSimQueueResult(kSerial, type, values, count));
+        ASSERT_EQ(0, PmxSimQueueResult(SENSOR_SERIAL, type, values, count));
         ASSERT_TRUE(m_cListener.waitData(++m_nQueued));
     }
     void queueFloats(std::int32_t type, const std::vector<float>& values)
