@@ -69,7 +69,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     LbPmxLan::CLineReader lines;
     lines.feed(reinterpret_cast<const char*>(data), size);
     std::string line;
-    while (lines.next(line) == LbPmxLan::CLineReader::Line) {
+    while (lines.next(line) == LbPmxLan::CLineReader::RESULT_LINE) {
         LbPmxLan::isQuery(line);
     }
     return 0;

@@ -33,7 +33,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
             check(PmxSim::validText(sensor.strType.c_str()));
             check(PmxSim::validText(sensor.strSerial.c_str()));
             check(serials.insert(PmxSim::lower(sensor.strSerial)).second);
-            check(sensor.power.eKind != PmxSim::SPowerModel::eSequence || !sensor.power.levels.empty());
+            check(sensor.power.eKind != PmxSim::SPowerModel::POWER_MODEL_SEQUENCE || !sensor.power.levels.empty());
             for (const PmxSim::SAnswer& answer : sensor.answers)
                 PmxSim::matchesPattern(answer.strPattern.c_str(), input.c_str());
         }

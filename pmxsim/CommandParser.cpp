@@ -13,8 +13,8 @@ namespace PmxSim {
 
 namespace {
 
-enum EParameter { eNoParameter, eInteger, eBoolean, eReal, eFunctionChoice, eUnitChoice };
-enum EUse { eSetOnly, eQueryOnly, eSetAndQuery };
+enum EParameter { PARAM_NONE, PARAM_INTEGER, PARAM_BOOLEAN, PARAM_REAL, PARAM_FUNCTION_CHOICE, PARAM_UNIT_CHOICE };
+enum EUse { USE_SET_ONLY, USE_QUERY_ONLY, USE_SET_AND_QUERY };
 
 // One command: its header (keywords in long form, the short form in upper case, optional
 // keywords in brackets), what it does, its parameter with the allowed range, and whether it is
@@ -29,29 +29,29 @@ struct SEntry {
 };
 
 const SEntry COMMANDS[] = {
-    {"*IDN", eIdn, eNoParameter, eQueryOnly, 0, 0},
-    {"*RST", eReset, eNoParameter, eSetOnly, 0, 0},
-    {"*CLS", eClearStatus, eNoParameter, eSetOnly, 0, 0},
-    {"*OPC", eOperationComplete, eNoParameter, eSetAndQuery, 0, 0},
-    {"*WAI", eNone, eNoParameter, eSetOnly, 0, 0},
-    {"*ESR", eEventStatus, eNoParameter, eQueryOnly, 0, 0},
-    {"*ESE", eEventEnable, eInteger, eSetAndQuery, 0, 255},
-    {"*SRE", eServiceEnable, eInteger, eSetAndQuery, 0, 255},
-    {"*TST", eSelfTest, eNoParameter, eQueryOnly, 0, 0},
-    {"*TRG", eMeasure, eNoParameter, eSetOnly, 0, 0},
-    {"INITiate [IMMediate]", eMeasure, eNoParameter, eSetOnly, 0, 0},
-    {"INITiate CONTinuous", eContinuous, eBoolean, eSetAndQuery, 0, 0},
-    {"ABORt", eAbort, eNoParameter, eSetOnly, 0, 0},
-    {"READ", eRead, eNoParameter, eQueryOnly, 0, 0},
-    {"MEASure [POWer]", eMeasurePower, eNoParameter, eQueryOnly, 0, 0},
-    {"FUNCtion", eFunction, eFunctionChoice, eSetAndQuery, 0, 0},
-    {"TRACe POINts", eTracePoints, eInteger, eSetAndQuery, 1, MAX_TRACE_POINTS},
-    {"[SENSe] FREQuency", eFrequency, eReal, eSetAndQuery, MIN_FREQUENCY_HZ, MAX_FREQUENCY_HZ},
-    {"[SENSe] AVERage COUNt", eAverageCount, eInteger, eSetAndQuery, 1, MAX_AVERAGE_COUNT},
-    {"[SENSe] AVERage [STATe]", eAveraging, eBoolean, eSetAndQuery, 0, 0},
-    {"[SENSe] CORRection OFFSet", eOffset, eReal, eSetAndQuery, -MAX_OFFSET_DB, MAX_OFFSET_DB},
-    {"UNIT POWer", eUnit, eUnitChoice, eSetAndQuery, 0, 0},
-    {"SYSTem VERSion", eVersion, eNoParameter, eQueryOnly, 0, 0},
+    {"*IDN", ACTION_IDN, PARAM_NONE, USE_QUERY_ONLY, 0, 0},
+    {"*RST", ACTION_RESET, PARAM_NONE, USE_SET_ONLY, 0, 0},
+    {"*CLS", ACTION_CLEAR_STATUS, PARAM_NONE, USE_SET_ONLY, 0, 0},
+    {"*OPC", ACTION_OPERATION_COMPLETE, PARAM_NONE, USE_SET_AND_QUERY, 0, 0},
+    {"*WAI", ACTION_NONE, PARAM_NONE, USE_SET_ONLY, 0, 0},
+    {"*ESR", ACTION_EVENT_STATUS, PARAM_NONE, USE_QUERY_ONLY, 0, 0},
+    {"*ESE", ACTION_EVENT_ENABLE, PARAM_INTEGER, USE_SET_AND_QUERY, 0, 255},
+    {"*SRE", ACTION_SERVICE_ENABLE, PARAM_INTEGER, USE_SET_AND_QUERY, 0, 255},
+    {"*TST", ACTION_SELF_TEST, PARAM_NONE, USE_QUERY_ONLY, 0, 0},
+    {"*TRG", ACTION_MEASURE, PARAM_NONE, USE_SET_ONLY, 0, 0},
+    {"INITiate [IMMediate]", ACTION_MEASURE, PARAM_NONE, USE_SET_ONLY, 0, 0},
+    {"INITiate CONTinuous", ACTION_CONTINUOUS, PARAM_BOOLEAN, USE_SET_AND_QUERY, 0, 0},
+    {"ABORt", ACTION_ABORT, PARAM_NONE, USE_SET_ONLY, 0, 0},
+    {"READ", ACTION_READ, PARAM_NONE, USE_QUERY_ONLY, 0, 0},
+    {"MEASure [POWer]", ACTION_MEASURE_POWER, PARAM_NONE, USE_QUERY_ONLY, 0, 0},
+    {"FUNCtion", ACTION_FUNCTION, PARAM_FUNCTION_CHOICE, USE_SET_AND_QUERY, 0, 0},
+    {"TRACe POINts", ACTION_TRACE_POINTS, PARAM_INTEGER, USE_SET_AND_QUERY, 1, MAX_TRACE_POINTS},
+    {"[SENSe] FREQuency", ACTION_FREQUENCY, PARAM_REAL, USE_SET_AND_QUERY, MIN_FREQUENCY_HZ, MAX_FREQUENCY_HZ},
+    {"[SENSe] AVERage COUNt", ACTION_AVERAGE_COUNT, PARAM_INTEGER, USE_SET_AND_QUERY, 1, MAX_AVERAGE_COUNT},
+    {"[SENSe] AVERage [STATe]", ACTION_AVERAGING, PARAM_BOOLEAN, USE_SET_AND_QUERY, 0, 0},
+    {"[SENSe] CORRection OFFSet", ACTION_OFFSET, PARAM_REAL, USE_SET_AND_QUERY, -MAX_OFFSET_DB, MAX_OFFSET_DB},
+    {"UNIT POWer", ACTION_UNIT, PARAM_UNIT_CHOICE, USE_SET_AND_QUERY, 0, 0},
+    {"SYSTem VERSion", ACTION_VERSION, PARAM_NONE, USE_QUERY_ONLY, 0, 0},
 };
 
 // One keyword of a pattern: its long form, its short form (the upper-case letters), both in
@@ -128,7 +128,7 @@ bool real(const std::string& text, EAction action, double low, double high, doub
     if (text.empty() || rest == text.c_str() || errno != 0 || !std::isfinite(parsed))
         return false;
     std::string unit = trim(rest);
-    if (action == eFrequency && !unit.empty()) {
+    if (action == ACTION_FREQUENCY && !unit.empty()) {
         const char* const FREQUENCY_UNITS[] = {"hz", "khz", "mhz", "ghz"};
         double scale = 1.0;
         bool known = false;
@@ -152,19 +152,19 @@ bool real(const std::string& text, EAction action, double low, double high, doub
 bool parameter(const SEntry& entry, const std::string& text, SCommand* command)
 {
     switch (entry.eParameter) {
-    case eNoParameter:
+    case PARAM_NONE:
         return text.empty();
-    case eInteger:
+    case PARAM_INTEGER:
         return integer(text, entry.dLow, entry.dHigh, &command->nValue);
-    case eReal:
+    case PARAM_REAL:
         return real(text, entry.eAction, entry.dLow, entry.dHigh, &command->dValue);
-    case eBoolean:
+    case PARAM_BOOLEAN:
         command->nValue = text == "on" || text == "1" ? 1 : 0;
         return text == "on" || text == "1" || text == "off" || text == "0";
-    case eFunctionChoice:
+    case PARAM_FUNCTION_CHOICE:
         command->nValue = text == "pow" || text == "power" ? FUNCTION_POWER : FUNCTION_TRACE;
         return text == "pow" || text == "power" || text == "trac" || text == "trace";
-    case eUnitChoice:
+    case PARAM_UNIT_CHOICE:
         command->nValue = text == "dbm" ? UNIT_DBM : UNIT_WATT;
         return text == "dbm" || text == "w";
     }
@@ -178,7 +178,7 @@ SCommand parseCommand(const std::string& text)
     SCommand command;
     std::string line = lower(trim(text.substr(0, text.find_first_of("\r\n"))));
     if (line.empty()) {
-        command.eAction = eNone;
+        command.eAction = ACTION_NONE;
         return command;
     }
     size_t blank = line.find_first_of(" \t");
@@ -206,7 +206,7 @@ SCommand parseCommand(const std::string& text)
         const SEntry& entry = COMMANDS[i];
         if (!matches(patterns()[i], 0, words, 0))
             continue;
-        bool allowed = command.bQuery ? entry.eUse != eSetOnly : entry.eUse != eQueryOnly;
+        bool allowed = command.bQuery ? entry.eUse != USE_SET_ONLY : entry.eUse != USE_QUERY_ONLY;
         bool good = command.bQuery ? argument.empty() : parameter(entry, argument, &command);
         if (allowed && good)
             command.eAction = entry.eAction;

@@ -53,24 +53,24 @@ PMX_API int32_t PmxGetData(int64_t handle, int32_t* dataType, int32_t* count, in
 }
 PMX_API int32_t PmxGetFloatResult(int64_t handle, float* value1, float* value2, float* value3)
 {
-    return sim().getScalars(PmxSim::eGetFloatResult, handle, value1, value2, value3);
+    return sim().getScalars(PmxSim::FN_GET_FLOAT_RESULT, handle, value1, value2, value3);
 }
 PMX_API int32_t PmxGetFloatArray(int64_t handle, float* values, int32_t capacity, int32_t* count)
 {
-    return sim().getFloatArrays(PmxSim::eGetFloatArray, handle, values, nullptr, nullptr, capacity, count);
+    return sim().getFloatArrays(PmxSim::FN_GET_FLOAT_ARRAY, handle, values, nullptr, nullptr, capacity, count);
 }
 PMX_API int32_t PmxGetAuxFloatArray(int64_t handle, float* values1, float* values2, float* values3, int32_t capacity,
                                     int32_t* count)
 {
-    return sim().getFloatArrays(PmxSim::eGetAuxFloatArray, handle, values1, values2, values3, capacity, count);
+    return sim().getFloatArrays(PmxSim::FN_GET_AUX_FLOAT_ARRAY, handle, values1, values2, values3, capacity, count);
 }
 PMX_API int32_t PmxGetLongResult(int64_t handle, int32_t* value1, int32_t* value2, int32_t* value3)
 {
-    return sim().getScalars(PmxSim::eGetLongResult, handle, value1, value2, value3);
+    return sim().getScalars(PmxSim::FN_GET_LONG_RESULT, handle, value1, value2, value3);
 }
 PMX_API int32_t PmxGetBitfieldResult(int64_t handle, int32_t* value1, int32_t* value2, int32_t* value3)
 {
-    return sim().getScalars(PmxSim::eGetBitfieldResult, handle, value1, value2, value3);
+    return sim().getScalars(PmxSim::FN_GET_BITFIELD_RESULT, handle, value1, value2, value3);
 }
 PMX_API int32_t PmxGetBinaryResult(int64_t handle, uint8_t* buffer, int32_t size, int32_t* count)
 {
@@ -100,19 +100,19 @@ PMX_API int32_t PmxSetNotifyCallbackDeviceChanged(PmxDeviceChangedCallback callb
 }
 PMX_API int32_t PmxSetNotifyCallbackErrorOccurred(PmxNotifyCallback callback, void* user)
 {
-    return sim().setNotifyCallback(PmxSim::eSetErrorOccurred, PmxSim::eErrorOccurred, callback, user);
+    return sim().setNotifyCallback(PmxSim::FN_SET_ERROR_OCCURRED, PmxSim::CALLBACK_ERROR_OCCURRED, callback, user);
 }
 PMX_API int32_t PmxSetNotifyCallbackDataAvailable(PmxNotifyCallback callback, void* user)
 {
-    return sim().setNotifyCallback(PmxSim::eSetDataAvailable, PmxSim::eDataAvailable, callback, user);
+    return sim().setNotifyCallback(PmxSim::FN_SET_DATA_AVAILABLE, PmxSim::CALLBACK_DATA_AVAILABLE, callback, user);
 }
 PMX_API int32_t PmxSetNotifyCallbackCommandAccepted(PmxNotifyCallback callback, void* user)
 {
-    return sim().setNotifyCallback(PmxSim::eSetCommandAccepted, PmxSim::eCommandAccepted, callback, user);
+    return sim().setNotifyCallback(PmxSim::FN_SET_COMMAND_ACCEPTED, PmxSim::CALLBACK_COMMAND_ACCEPTED, callback, user);
 }
 PMX_API int32_t PmxSetNotifyCallbackStateChanged(PmxNotifyCallback callback, void* user)
 {
-    return sim().setNotifyCallback(PmxSim::eSetStateChanged, PmxSim::eStateChanged, callback, user);
+    return sim().setNotifyCallback(PmxSim::FN_SET_STATE_CHANGED, PmxSim::CALLBACK_STATE_CHANGED, callback, user);
 }
 
 PMX_API int32_t PmxSimReset(void)

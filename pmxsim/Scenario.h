@@ -19,11 +19,11 @@ namespace PmxSim {
 // The power at a sensor's input, in dBm, before the settings shape it.
 struct SPowerModel {
     enum EKind {
-        eBuiltIn,  // -20 dBm with +-0.05 dB evenly spread noise
-        eConstant, // dLevelDbm, no noise
-        eSequence, // levels, one per measurement, repeated from the start
-        eNoisy     // dLevelDbm with Gaussian noise of dNoiseDb (standard deviation)
-    } eKind = eBuiltIn;
+        POWER_MODEL_BUILT_IN, // -20 dBm with +-0.05 dB evenly spread noise
+        POWER_MODEL_CONSTANT, // dLevelDbm, no noise
+        POWER_MODEL_SEQUENCE, // levels, one per measurement, repeated from the start
+        POWER_MODEL_NOISY     // dLevelDbm with Gaussian noise of dNoiseDb (standard deviation)
+    } eKind = POWER_MODEL_BUILT_IN;
     double dLevelDbm = -20.0;
     std::vector<double> levels;
     double dNoiseDb = 0.0;

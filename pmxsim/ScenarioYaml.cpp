@@ -94,10 +94,10 @@ void readPower(const YAML::Node& node, SSensorModel* sensor)
 {
     SPowerModel& power = sensor->power;
     if (node.IsScalar()) {
-        power.eKind = SPowerModel::eConstant;
+        power.eKind = SPowerModel::POWER_MODEL_CONSTANT;
         power.dLevelDbm = real(node, "power", -200, 100);
     } else if (node.IsSequence()) {
-        power.eKind = SPowerModel::eSequence;
+        power.eKind = SPowerModel::POWER_MODEL_SEQUENCE;
         if (node.size() == 0 || node.size() > MAX_SEQUENCE)
             fail(node, "the power sequence must hold 1 to 100000 levels");
         for (const auto& level : node)
@@ -106,7 +106,7 @@ void readPower(const YAML::Node& node, SSensorModel* sensor)
         expectMap(node, "power", {"level", "noise", "seed"});
         if (!node["level"])
             fail(node, "power needs a level");
-        power.eKind = SPowerModel::eNoisy;
+        power.eKind = SPowerModel::POWER_MODEL_NOISY;
         power.dLevelDbm = real(node["level"], "the power level", -200, 100);
         if (node["noise"])
             power.dNoiseDb = real(node["noise"], "the power noise", 0, 100);

@@ -37,35 +37,42 @@ namespace PmxSim {
 
 // The library functions that PmxSimFailNext can make fail, in export-table order.
 enum EFunction {
-    eOpenDriver,
-    eCloseDriver,
-    eOpenSensor,
-    eCloseSensor,
-    eSendCommand,
-    eGetData,
-    eGetFloatResult,
-    eGetFloatArray,
-    eGetAuxFloatArray,
-    eGetLongResult,
-    eGetBitfieldResult,
-    eGetBinaryResult,
-    eGetStringResult,
-    eGetTriggerState,
-    eGetDeviceListLength,
-    eGetDeviceInfo,
-    eClearDevice,
-    eEmptyAllBuffers,
-    eGetErrorText,
-    eSetDeviceChanged,
-    eSetErrorOccurred,
-    eSetDataAvailable,
-    eSetCommandAccepted,
-    eSetStateChanged,
-    eFunctionCount
+    FN_OPEN_DRIVER,
+    FN_CLOSE_DRIVER,
+    FN_OPEN_SENSOR,
+    FN_CLOSE_SENSOR,
+    FN_SEND_COMMAND,
+    FN_GET_DATA,
+    FN_GET_FLOAT_RESULT,
+    FN_GET_FLOAT_ARRAY,
+    FN_GET_AUX_FLOAT_ARRAY,
+    FN_GET_LONG_RESULT,
+    FN_GET_BITFIELD_RESULT,
+    FN_GET_BINARY_RESULT,
+    FN_GET_STRING_RESULT,
+    FN_GET_TRIGGER_STATE,
+    FN_GET_DEVICE_LIST_LENGTH,
+    FN_GET_DEVICE_INFO,
+    FN_CLEAR_DEVICE,
+    FN_EMPTY_ALL_BUFFERS,
+    FN_GET_ERROR_TEXT,
+    FN_SET_DEVICE_CHANGED,
+    FN_SET_ERROR_OCCURRED,
+    FN_SET_DATA_AVAILABLE,
+    FN_SET_COMMAND_ACCEPTED,
+    FN_SET_STATE_CHANGED,
+    FN_COUNT
 };
-static_assert(eFunctionCount == FUNCTION_COUNT, "one name per library function");
+static_assert(FN_COUNT == FUNCTION_COUNT, "one name per library function");
 
-enum ECallback { eCommandAccepted, eStateChanged, eDataAvailable, eErrorOccurred, eDeviceChanged, eCallbackCount };
+enum ECallback {
+    CALLBACK_COMMAND_ACCEPTED,
+    CALLBACK_STATE_CHANGED,
+    CALLBACK_DATA_AVAILABLE,
+    CALLBACK_ERROR_OCCURRED,
+    CALLBACK_DEVICE_CHANGED,
+    CALLBACK_COUNT
+};
 
 class CSimulator {
 public:
@@ -162,7 +169,7 @@ private:
     };
 
     struct STask {
-        enum EKind { eCommand, eMeasurementDone } eKind;
+        enum EKind { TASK_COMMAND, TASK_MEASUREMENT_DONE } eKind;
         SensorPtr pSensor;
         int64_t nHandle; // the handle the task was made for; a closed or reopened sensor drops it
         std::string strText;
@@ -177,11 +184,11 @@ private:
 
     // What a library function needs before its own work: nothing but the lock, the driver open,
     // or an open, attached sensor for its handle.
-    enum ENeed { eNeedNothing, eNeedDriver, eNeedSensor };
+    enum ENeed { NEED_NOTHING, NEED_DRIVER, NEED_SENSOR };
 
     // The shared start of every library function: takes the lock for the scope, then fails with
     // an injected failure, a closed driver or an unusable handle, as the function needs. code()
-    // is 0 when the function may go on; sensor() is then the handle's sensor (eNeedSensor).
+    // is 0 when the function may go on; sensor() is then the handle's sensor (NEED_SENSOR).
     class SCOPED_CAPABILITY CCall {
     public:
         CCall(CSimulator& sim, EFunction fn, ENeed need, int64_t handle = 0) ACQUIRE(sim.m_aMutex);
@@ -270,16 +277,16 @@ private:
     std::map<std::pair<Clock::time_point, uint64_t>, STask> m_aTasks GUARDED_BY(m_aMutex);
     uint64_t m_nTaskSequence GUARDED_BY(m_aMutex) = 0;
 
-    SCallback m_aCallbacks[eCallbackCount] GUARDED_BY(m_aMutex);
-    int m_aDelivering[eCallbackCount] GUARDED_BY(m_aMutex) = {}; // running now, per kind
+    SCallback m_aCallbacks[CALLBACK_COUNT] GUARDED_BY(m_aMutex);
+    int m_aDelivering[CALLBACK_COUNT] GUARDED_BY(m_aMutex) = {}; // running now, per kind
     uint64_t m_nDeliveries GUARDED_BY(m_aMutex) = 0;             // callbacks that have returned
 
     int32_t m_nAckMs GUARDED_BY(m_aMutex) = 0;
     int32_t m_nMeasureMs GUARDED_BY(m_aMutex) = 0;
     bool m_bAutoAck GUARDED_BY(m_aMutex) = true;
-    int32_t m_aInjected[eFunctionCount] GUARDED_BY(m_aMutex);
-    uint64_t m_aCalls[eFunctionCount] GUARDED_BY(m_aMutex); // since the scenario was loaded
-    std::vector<SFault> m_aFaults GUARDED_BY(m_aMutex);     // scripted by the scenario
+    int32_t m_aInjected[FN_COUNT] GUARDED_BY(m_aMutex);
+    uint64_t m_aCalls[FN_COUNT] GUARDED_BY(m_aMutex);   // since the scenario was loaded
+    std::vector<SFault> m_aFaults GUARDED_BY(m_aMutex); // scripted by the scenario
     std::minstd_rand m_aRandom GUARDED_BY(m_aMutex);
 };
 

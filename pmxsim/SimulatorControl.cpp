@@ -20,8 +20,8 @@ void CSimulator::loadDefaultsLocked()
     m_nAckMs = scenario.nAckMs;
     m_nMeasureMs = scenario.nMeasureMs;
     m_bAutoAck = true;
-    std::fill(m_aInjected, m_aInjected + eFunctionCount, 0);
-    std::fill(m_aCalls, m_aCalls + eFunctionCount, 0);
+    std::fill(m_aInjected, m_aInjected + FN_COUNT, 0);
+    std::fill(m_aCalls, m_aCalls + FN_COUNT, 0);
     m_aFaults = scenario.faults;
 }
 
@@ -90,7 +90,7 @@ int32_t CSimulator::attach(const char* type, const char* serial)
     model.strType = type;
     model.strSerial = serial;
     m_aSensors.push_back(makeSensor(model));
-    post(eDeviceChanged, 0, 0);
+    post(CALLBACK_DEVICE_CHANGED, 0, 0);
     return PMX_SUCCESS;
 }
 
@@ -115,7 +115,7 @@ void CSimulator::detachLocked(SensorPtr sensor)
     sensor->bMeasuring = false;
     sensor->bContinuous = false;
     sensor->results.clear();
-    post(eDeviceChanged, 0, 0);
+    post(CALLBACK_DEVICE_CHANGED, 0, 0);
 }
 
 int32_t CSimulator::setDeviceFlag(const char* serial, int32_t flag)
@@ -127,7 +127,7 @@ int32_t CSimulator::setDeviceFlag(const char* serial, int32_t flag)
     if (!sensor)
         return PMXSIM_E_NO_SUCH_SENSOR;
     sensor->nFlag = flag;
-    post(eDeviceChanged, 0, 0);
+    post(CALLBACK_DEVICE_CHANGED, 0, 0);
     return PMX_SUCCESS;
 }
 
@@ -181,7 +181,7 @@ int32_t CSimulator::reportError(const char* serial, int32_t code)
             return result;
         handle = sensor->nHandle;
     }
-    post(eErrorOccurred, handle, code);
+    post(CALLBACK_ERROR_OCCURRED, handle, code);
     return PMX_SUCCESS;
 }
 
@@ -234,7 +234,7 @@ int32_t CSimulator::failNext(const char* function, int32_t code)
     CLock lock(*this);
     if (function == nullptr)
         return PMXSIM_E_INVALID_ARGUMENT;
-    for (int fn = 0; fn < eFunctionCount; ++fn) {
+    for (int fn = 0; fn < FN_COUNT; ++fn) {
         if (std::strcmp(functionName(fn), function) == 0) {
             m_aInjected[fn] = code;
             return PMX_SUCCESS;

@@ -56,9 +56,9 @@ CSimulator::CCall::CCall(CSimulator& sim, EFunction fn, ENeed need, int64_t hand
     sim.m_aMutex.lock();
     if (sim.takeInjected(fn, &m_nCode))
         return;
-    if (need == eNeedSensor)
+    if (need == NEED_SENSOR)
         m_nCode = sim.findOpen(handle, &m_pSensor);
-    else if (need == eNeedDriver && !sim.m_bDriverOpen)
+    else if (need == NEED_DRIVER && !sim.m_bDriverOpen)
         m_nCode = PMXSIM_E_DRIVER_NOT_OPEN;
 }
 
@@ -118,7 +118,7 @@ void CSimulator::workerMain(void* arg)
 
 int32_t CSimulator::openDriver()
 {
-    CCall call(*this, eOpenDriver, eNeedNothing);
+    CCall call(*this, FN_OPEN_DRIVER, NEED_NOTHING);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     // Opening an open driver succeeds and changes nothing; opens are not counted.
@@ -146,7 +146,7 @@ int32_t CSimulator::closeDriver()
 {
     SWorker* worker;
     {
-        CCall call(*this, eCloseDriver, eNeedDriver);
+        CCall call(*this, FN_CLOSE_DRIVER, NEED_DRIVER);
         if (call.code() != PMX_SUCCESS)
             return call.code();
         worker = stopDriverLocked();
@@ -213,7 +213,7 @@ void CSimulator::run(uint64_t generation)
             ++m_aDelivering[event.eKind];
             m_aMutex.unlock();
             t_bInCallback = true;
-            if (event.eKind == eDeviceChanged)
+            if (event.eKind == CALLBACK_DEVICE_CHANGED)
                 callback.pfnDevice(callback.pvUser);
             else
                 callback.pfnNotify(event.nHandle, event.nValue, callback.pvUser);
@@ -263,7 +263,7 @@ void CSimulator::schedule(Clock::time_point due, STask task)
 
 int32_t CSimulator::setNotifyCallback(EFunction fn, ECallback kind, PmxNotifyCallback callback, void* user)
 {
-    CCall call(*this, fn, eNeedNothing);
+    CCall call(*this, fn, NEED_NOTHING);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     m_aCallbacks[kind].pfnNotify = callback;
@@ -274,12 +274,12 @@ int32_t CSimulator::setNotifyCallback(EFunction fn, ECallback kind, PmxNotifyCal
 
 int32_t CSimulator::setDeviceChangedCallback(PmxDeviceChangedCallback callback, void* user)
 {
-    CCall call(*this, eSetDeviceChanged, eNeedNothing);
+    CCall call(*this, FN_SET_DEVICE_CHANGED, NEED_NOTHING);
     if (call.code() != PMX_SUCCESS)
         return call.code();
-    m_aCallbacks[eDeviceChanged].pfnDevice = callback;
-    m_aCallbacks[eDeviceChanged].pvUser = callback != nullptr ? user : nullptr;
-    waitForDeliveryLocked(eDeviceChanged);
+    m_aCallbacks[CALLBACK_DEVICE_CHANGED].pfnDevice = callback;
+    m_aCallbacks[CALLBACK_DEVICE_CHANGED].pvUser = callback != nullptr ? user : nullptr;
+    waitForDeliveryLocked(CALLBACK_DEVICE_CHANGED);
     return PMX_SUCCESS;
 }
 

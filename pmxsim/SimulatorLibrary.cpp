@@ -18,7 +18,7 @@ namespace PmxSim {
 // fields in any letter case.
 int32_t CSimulator::openSensor(const char* descriptor, int64_t* handle)
 {
-    CCall call(*this, eOpenSensor, eNeedDriver);
+    CCall call(*this, FN_OPEN_SENSOR, NEED_DRIVER);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     if (descriptor == nullptr || handle == nullptr)
@@ -72,7 +72,7 @@ int32_t CSimulator::openSensor(const char* descriptor, int64_t* handle)
 // Closing the handle of a detached sensor succeeds: it releases what is left of the session.
 int32_t CSimulator::closeSensor(int64_t handle)
 {
-    CCall call(*this, eCloseSensor, eNeedDriver);
+    CCall call(*this, FN_CLOSE_SENSOR, NEED_DRIVER);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     auto it = m_aOpen.find(handle);
@@ -90,7 +90,7 @@ int32_t CSimulator::closeSensor(int64_t handle)
 // The timeout argument is only recorded: commands are queued and answered through the callbacks.
 int32_t CSimulator::sendCommand(int64_t handle, const char* text, int32_t timeout)
 {
-    CCall call(*this, eSendCommand, eNeedSensor, handle);
+    CCall call(*this, FN_SEND_COMMAND, NEED_SENSOR, handle);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     if (text == nullptr)
@@ -101,13 +101,13 @@ int32_t CSimulator::sendCommand(int64_t handle, const char* text, int32_t timeou
     // Commands of one sensor are answered in the order sent, even when the delay was shortened.
     Clock::time_point due = std::max(Clock::now() + std::chrono::milliseconds(m_nAckMs), sensor.tLastCommand);
     sensor.tLastCommand = due;
-    schedule(due, STask{STask::eCommand, m_aOpen.at(handle), handle, text, 0});
+    schedule(due, STask{STask::TASK_COMMAND, m_aOpen.at(handle), handle, text, 0});
     return PMX_SUCCESS;
 }
 
 int32_t CSimulator::clearDevice(int64_t handle)
 {
-    CCall call(*this, eClearDevice, eNeedSensor, handle);
+    CCall call(*this, FN_CLEAR_DEVICE, NEED_SENSOR, handle);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     abortMeasurement(call.sensor());
@@ -117,7 +117,7 @@ int32_t CSimulator::clearDevice(int64_t handle)
 
 int32_t CSimulator::emptyAllBuffers(int64_t handle)
 {
-    CCall call(*this, eEmptyAllBuffers, eNeedSensor, handle);
+    CCall call(*this, FN_EMPTY_ALL_BUFFERS, NEED_SENSOR, handle);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     call.sensor().results.clear();
@@ -126,7 +126,7 @@ int32_t CSimulator::emptyAllBuffers(int64_t handle)
 
 int32_t CSimulator::getTriggerState(int64_t handle, int32_t* state)
 {
-    CCall call(*this, eGetTriggerState, eNeedSensor, handle);
+    CCall call(*this, FN_GET_TRIGGER_STATE, NEED_SENSOR, handle);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     if (state == nullptr)
@@ -141,7 +141,7 @@ int32_t CSimulator::getTriggerState(int64_t handle, int32_t* state)
 // and the number of pending results. Null outputs are skipped.
 int32_t CSimulator::getData(int64_t handle, int32_t* dataType, int32_t* count, int32_t* pending)
 {
-    CCall call(*this, eGetData, eNeedSensor, handle);
+    CCall call(*this, FN_GET_DATA, NEED_SENSOR, handle);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     const std::deque<SResult>& results = call.sensor().results;
@@ -173,14 +173,16 @@ int32_t CSimulator::checkPending(const SSensor& sensor, int32_t firstType, int32
 // values, 0 for those not queued. Null outputs are skipped.
 int32_t CSimulator::getScalars(EFunction fn, int64_t handle, void* v1, void* v2, void* v3)
 {
-    CCall call(*this, fn, eNeedSensor, handle);
+    CCall call(*this, fn, NEED_SENSOR, handle);
     if (call.code() != PMX_SUCCESS)
         return call.code();
-    bool floats = fn == eGetFloatResult;
-    int32_t first = floats     ? PMXSIM_TYPE_FLOAT_TRIPLE
-        : fn == eGetLongResult ? PMXSIM_TYPE_LONG_TRIPLE
-                               : PMXSIM_TYPE_BITFIELD1;
-    int32_t last = floats ? PMXSIM_TYPE_FLOAT_STREAM : fn == eGetLongResult ? PMXSIM_TYPE_LONG : PMXSIM_TYPE_BITFIELD3;
+    bool floats = fn == FN_GET_FLOAT_RESULT;
+    int32_t first = floats         ? PMXSIM_TYPE_FLOAT_TRIPLE
+        : fn == FN_GET_LONG_RESULT ? PMXSIM_TYPE_LONG_TRIPLE
+                                   : PMXSIM_TYPE_BITFIELD1;
+    int32_t last = floats          ? PMXSIM_TYPE_FLOAT_STREAM
+        : fn == FN_GET_LONG_RESULT ? PMXSIM_TYPE_LONG
+                                   : PMXSIM_TYPE_BITFIELD3;
     SSensor& sensor = call.sensor();
     if (int32_t code = checkPending(sensor, first, last))
         return code;
@@ -204,10 +206,10 @@ int32_t CSimulator::getScalars(EFunction fn, int64_t handle, void* v1, void* v2,
 int32_t CSimulator::getFloatArrays(EFunction fn, int64_t handle, float* a1, float* a2, float* a3, int32_t capacity,
                                    int32_t* count)
 {
-    CCall call(*this, fn, eNeedSensor, handle);
+    CCall call(*this, fn, NEED_SENSOR, handle);
     if (call.code() != PMX_SUCCESS)
         return call.code();
-    int32_t type = fn == eGetFloatArray ? PMXSIM_TYPE_FLOAT_ARRAY : PMXSIM_TYPE_AUX_FLOAT_ARRAY;
+    int32_t type = fn == FN_GET_FLOAT_ARRAY ? PMXSIM_TYPE_FLOAT_ARRAY : PMXSIM_TYPE_AUX_FLOAT_ARRAY;
     SSensor& sensor = call.sensor();
     if (int32_t code = checkPending(sensor, type, type))
         return code;
@@ -228,7 +230,7 @@ int32_t CSimulator::getFloatArrays(EFunction fn, int64_t handle, float* a1, floa
 
 int32_t CSimulator::getBinaryResult(int64_t handle, uint8_t* buffer, int32_t size, int32_t* count)
 {
-    CCall call(*this, eGetBinaryResult, eNeedSensor, handle);
+    CCall call(*this, FN_GET_BINARY_RESULT, NEED_SENSOR, handle);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     SSensor& sensor = call.sensor();
@@ -248,7 +250,7 @@ int32_t CSimulator::getBinaryResult(int64_t handle, uint8_t* buffer, int32_t siz
 // The text and its terminating zero must fit.
 int32_t CSimulator::getStringResult(int64_t handle, char* buffer, int32_t size)
 {
-    CCall call(*this, eGetStringResult, eNeedSensor, handle);
+    CCall call(*this, FN_GET_STRING_RESULT, NEED_SENSOR, handle);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     SSensor& sensor = call.sensor();
@@ -269,7 +271,7 @@ int32_t CSimulator::getStringResult(int64_t handle, char* buffer, int32_t size)
 
 int32_t CSimulator::getDeviceListLength(int32_t* count)
 {
-    CCall call(*this, eGetDeviceListLength, eNeedDriver);
+    CCall call(*this, FN_GET_DEVICE_LIST_LENGTH, NEED_DRIVER);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     if (count == nullptr)
@@ -281,7 +283,7 @@ int32_t CSimulator::getDeviceListLength(int32_t* count)
 // name: the sensor's descriptor when its type is a known model, else "<type> <serial>".
 int32_t CSimulator::getDeviceInfo(int32_t index, char* name, char* type, char* serial, int32_t* flag)
 {
-    CCall call(*this, eGetDeviceInfo, eNeedDriver);
+    CCall call(*this, FN_GET_DEVICE_INFO, NEED_DRIVER);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     if (name == nullptr || type == nullptr || serial == nullptr || flag == nullptr)
@@ -307,7 +309,7 @@ int32_t CSimulator::getDeviceInfo(int32_t index, char* name, char* type, char* s
 // buffer is cut to fit (always zero-terminated).
 int32_t CSimulator::getErrorText(int32_t code, char* buffer, int32_t size)
 {
-    CCall call(*this, eGetErrorText, eNeedNothing);
+    CCall call(*this, FN_GET_ERROR_TEXT, NEED_NOTHING);
     if (call.code() != PMX_SUCCESS)
         return call.code();
     if (buffer == nullptr || size < 1)

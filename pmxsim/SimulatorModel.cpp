@@ -38,7 +38,7 @@ float CSimulator::noise()
 void CSimulator::setState(SSensor& sensor, int32_t state)
 {
     sensor.nTriggerState = state;
-    post(eStateChanged, sensor.nHandle, state);
+    post(CALLBACK_STATE_CHANGED, sensor.nHandle, state);
 }
 
 void CSimulator::abortMeasurement(SSensor& sensor)
@@ -60,7 +60,8 @@ void CSimulator::startMeasurement(SSensor& sensor, bool trace, Clock::time_point
     setState(sensor, TRIGGER_STATE_MEASURING);
     // A continuous measurement takes at least 1 ms so that it cannot saturate the callback thread.
     int32_t duration = sensor.bContinuous ? std::max(m_nMeasureMs, 1) : m_nMeasureMs;
-    STask task{STask::eMeasurementDone, m_aOpen.at(sensor.nHandle), sensor.nHandle, std::string(), sensor.nMeasurement};
+    STask task{STask::TASK_MEASUREMENT_DONE, m_aOpen.at(sensor.nHandle), sensor.nHandle, std::string(),
+               sensor.nMeasurement};
     schedule(now + std::chrono::milliseconds(duration), std::move(task));
 }
 
@@ -80,15 +81,15 @@ float CSimulator::powerReading(SSensor& sensor)
 {
     const SPowerModel& power = sensor.pModel->power;
     switch (power.eKind) {
-    case SPowerModel::eConstant:
+    case SPowerModel::POWER_MODEL_CONSTANT:
         return reading(sensor, power.dLevelDbm, 0.0);
-    case SPowerModel::eSequence:
+    case SPowerModel::POWER_MODEL_SEQUENCE:
         return reading(sensor, power.levels[sensor.nNextLevel++ % power.levels.size()], 0.0);
-    case SPowerModel::eNoisy: {
+    case SPowerModel::POWER_MODEL_NOISY: {
         std::normal_distribution<double> gauss(0.0, power.dNoiseDb);
         return reading(sensor, power.dLevelDbm, power.dNoiseDb > 0.0 ? gauss(sensor.aNoise) : 0.0);
     }
-    case SPowerModel::eBuiltIn:
+    case SPowerModel::POWER_MODEL_BUILT_IN:
         break;
     }
     return reading(sensor, POWER_DBM, noise());
@@ -154,7 +155,7 @@ void CSimulator::runTask(STask& task, Clock::time_point now)
     SSensor& sensor = *task.pSensor;
     if (!sensor.bAttached || sensor.nHandle != task.nHandle)
         return;
-    if (task.eKind == STask::eCommand) {
+    if (task.eKind == STask::TASK_COMMAND) {
         runCommand(sensor, task.strText, now);
     } else if (sensor.bMeasuring && task.nMeasurement == sensor.nMeasurement) {
         finishMeasurement(sensor, now);
@@ -168,20 +169,21 @@ void CSimulator::runCommand(SSensor& sensor, const std::string& text, Clock::tim
     if (answerFromModel(sensor, text))
         return;
     SCommand command = parseCommand(text);
-    bool starts = command.eAction == eMeasure || command.eAction == eRead || command.eAction == eMeasurePower;
-    bool stopsContinuous = command.eAction == eContinuous && !command.bQuery && command.nValue == 0;
+    bool starts =
+        command.eAction == ACTION_MEASURE || command.eAction == ACTION_READ || command.eAction == ACTION_MEASURE_POWER;
+    bool stopsContinuous = command.eAction == ACTION_CONTINUOUS && !command.bQuery && command.nValue == 0;
     // Asking for a measurement while one runs, or for the end of a continuous measurement that
     // is not running, is harmless and answered with the benign notice.
     bool ignored = (starts && sensor.bMeasuring) || (stopsContinuous && !sensor.bContinuous);
-    if (command.eAction == eUnknown) {
+    if (command.eAction == ACTION_UNKNOWN) {
         sensor.nEventStatus |= EVENT_COMMAND_ERROR;
-        post(eErrorOccurred, sensor.nHandle, PMX_ERR_UNKNOWN_COMMAND);
+        post(CALLBACK_ERROR_OCCURRED, sensor.nHandle, PMX_ERR_UNKNOWN_COMMAND);
     }
     if (ignored)
-        post(eErrorOccurred, sensor.nHandle, PMX_INFO_COMMAND_IGNORED);
+        post(CALLBACK_ERROR_OCCURRED, sensor.nHandle, PMX_INFO_COMMAND_IGNORED);
     ++sensor.nCommandCount;
     if (m_bAutoAck)
-        post(eCommandAccepted, sensor.nHandle, sensor.nCommandCount);
+        post(CALLBACK_COMMAND_ACCEPTED, sensor.nHandle, sensor.nCommandCount);
     if (!ignored)
         applyCommand(sensor, command, now);
 }
@@ -189,22 +191,22 @@ void CSimulator::runCommand(SSensor& sensor, const std::string& text, Clock::tim
 void CSimulator::applyCommand(SSensor& sensor, const SCommand& command, Clock::time_point now)
 {
     switch (command.eAction) {
-    case eIdn:
+    case ACTION_IDN:
         addText(sensor, "Marlowe&Tenby," + sensor.strType + "," + sensor.strSerial + "," + FIRMWARE_VERSION);
         break;
-    case eReset:
+    case ACTION_RESET:
         abortMeasurement(sensor);
         sensor.settings = SSettings();
         sensor.results.clear();
         break;
-    case eMeasure:
-    case eRead:
+    case ACTION_MEASURE:
+    case ACTION_READ:
         startMeasurement(sensor, sensor.settings.bTrace, now);
         break;
-    case eMeasurePower:
+    case ACTION_MEASURE_POWER:
         startMeasurement(sensor, false, now);
         break;
-    case eContinuous:
+    case ACTION_CONTINUOUS:
         if (command.bQuery) {
             addText(sensor, sensor.bContinuous ? "1" : "0");
         } else if (command.nValue != 0) {
@@ -215,29 +217,29 @@ void CSimulator::applyCommand(SSensor& sensor, const SCommand& command, Clock::t
             sensor.bContinuous = false; // the running measurement still ends with its result
         }
         break;
-    case eAbort:
+    case ACTION_ABORT:
         abortMeasurement(sensor);
         break;
-    case eClearStatus:
-    case eOperationComplete:
-    case eEventStatus:
-    case eEventEnable:
-    case eServiceEnable:
-    case eSelfTest:
-    case eVersion:
+    case ACTION_CLEAR_STATUS:
+    case ACTION_OPERATION_COMPLETE:
+    case ACTION_EVENT_STATUS:
+    case ACTION_EVENT_ENABLE:
+    case ACTION_SERVICE_ENABLE:
+    case ACTION_SELF_TEST:
+    case ACTION_VERSION:
         applyStatusCommand(sensor, command);
         break;
-    case eFunction:
-    case eTracePoints:
-    case eFrequency:
-    case eAverageCount:
-    case eAveraging:
-    case eOffset:
-    case eUnit:
+    case ACTION_FUNCTION:
+    case ACTION_TRACE_POINTS:
+    case ACTION_FREQUENCY:
+    case ACTION_AVERAGE_COUNT:
+    case ACTION_AVERAGING:
+    case ACTION_OFFSET:
+    case ACTION_UNIT:
         applySetting(sensor, command);
         break;
-    case eNone:
-    case eUnknown:
+    case ACTION_NONE:
+    case ACTION_UNKNOWN:
         break;
     }
 }
@@ -246,34 +248,34 @@ void CSimulator::applyCommand(SSensor& sensor, const SCommand& command, Clock::t
 // *OPC or *OPC? is reached; a measurement still running reports its end through its result.
 void CSimulator::applyStatusCommand(SSensor& sensor, const SCommand& command)
 {
-    int32_t* enable = command.eAction == eEventEnable ? &sensor.nEventEnable
-        : command.eAction == eServiceEnable           ? &sensor.nServiceEnable
-                                                      : nullptr;
+    int32_t* enable = command.eAction == ACTION_EVENT_ENABLE ? &sensor.nEventEnable
+        : command.eAction == ACTION_SERVICE_ENABLE           ? &sensor.nServiceEnable
+                                                             : nullptr;
     switch (command.eAction) {
-    case eClearStatus:
+    case ACTION_CLEAR_STATUS:
         sensor.nEventStatus = 0;
         break;
-    case eOperationComplete:
+    case ACTION_OPERATION_COMPLETE:
         if (command.bQuery)
             addText(sensor, "1");
         else
             sensor.nEventStatus |= EVENT_OPERATION_COMPLETE;
         break;
-    case eEventStatus: // reading the register clears it
+    case ACTION_EVENT_STATUS: // reading the register clears it
         addText(sensor, std::to_string(sensor.nEventStatus));
         sensor.nEventStatus = 0;
         break;
-    case eEventEnable:
-    case eServiceEnable:
+    case ACTION_EVENT_ENABLE:
+    case ACTION_SERVICE_ENABLE:
         if (command.bQuery)
             addText(sensor, std::to_string(*enable));
         else
             *enable = command.nValue;
         break;
-    case eSelfTest:
+    case ACTION_SELF_TEST:
         addText(sensor, "0");
         break;
-    case eVersion:
+    case ACTION_VERSION:
         addText(sensor, SCPI_VERSION);
         break;
     default:
@@ -287,43 +289,43 @@ void CSimulator::applySetting(SSensor& sensor, const SCommand& command)
     SSettings& settings = sensor.settings;
     bool query = command.bQuery;
     switch (command.eAction) {
-    case eFunction:
+    case ACTION_FUNCTION:
         if (query)
             addText(sensor, settings.bTrace ? "TRACE" : "POWER");
         else
             settings.bTrace = command.nValue == FUNCTION_TRACE;
         break;
-    case eTracePoints:
+    case ACTION_TRACE_POINTS:
         if (query)
             addText(sensor, std::to_string(settings.nTracePoints));
         else
             settings.nTracePoints = command.nValue;
         break;
-    case eFrequency:
+    case ACTION_FREQUENCY:
         if (query)
             addText(sensor, number(settings.dFrequencyHz));
         else
             settings.dFrequencyHz = command.dValue;
         break;
-    case eAverageCount:
+    case ACTION_AVERAGE_COUNT:
         if (query)
             addText(sensor, std::to_string(settings.nAverageCount));
         else
             settings.nAverageCount = command.nValue;
         break;
-    case eAveraging:
+    case ACTION_AVERAGING:
         if (query)
             addText(sensor, settings.bAveraging ? "1" : "0");
         else
             settings.bAveraging = command.nValue != 0;
         break;
-    case eOffset:
+    case ACTION_OFFSET:
         if (query)
             addText(sensor, number(settings.dOffsetDb));
         else
             settings.dOffsetDb = command.dValue;
         break;
-    case eUnit:
+    case ACTION_UNIT:
         if (query)
             addText(sensor, settings.bWatt ? "W" : "DBM");
         else
@@ -346,11 +348,11 @@ bool CSimulator::answerFromModel(SSensor& sensor, const std::string& text)
             continue;
         if (answer.bError) {
             sensor.nEventStatus |= EVENT_COMMAND_ERROR;
-            post(eErrorOccurred, sensor.nHandle, answer.nCode);
+            post(CALLBACK_ERROR_OCCURRED, sensor.nHandle, answer.nCode);
         }
         ++sensor.nCommandCount;
         if (m_bAutoAck)
-            post(eCommandAccepted, sensor.nHandle, sensor.nCommandCount);
+            post(CALLBACK_COMMAND_ACCEPTED, sensor.nHandle, sensor.nCommandCount);
         if (!answer.bError)
             addText(sensor, answer.strAnswer);
         return true;
@@ -372,7 +374,7 @@ void CSimulator::addResult(SSensor& sensor, SResult result)
     if (sensor.results.size() >= MAX_PENDING)
         sensor.results.pop_front();
     sensor.results.push_back(std::move(result));
-    post(eDataAvailable, sensor.nHandle, type);
+    post(CALLBACK_DATA_AVAILABLE, sensor.nHandle, type);
 }
 
 } // namespace PmxSim

@@ -13,14 +13,14 @@ TEST_F(PmxSimTest, MeasurementReportsStatesThenResultOnOneLibraryThreadInOrder)
     int64_t handle = open();
     ASSERT_GT(handle, int64_t(0xFFFFFFFF)) << "handles need all 64 bits";
     ASSERT_EQ(0, PmxSendCommand(handle, "*TRG", 0));
-    ASSERT_TRUE(m_aRecorder.waitFor([&](const SCall& c) { return c.kind == eState && c.value == 0; }));
+    ASSERT_TRUE(m_aRecorder.waitFor([&](const SCall& c) { return c.kind == KIND_STATE && c.value == 0; }));
 
     std::vector<SCall> calls = m_aRecorder.calls();
-    std::vector<SCall> expected = {{eAccepted, handle, 1, {}},
-                                   {eState, handle, 2, {}},
-                                   {eState, handle, 3, {}},
-                                   {eData, handle, 6, {}},
-                                   {eState, handle, 0, {}}};
+    std::vector<SCall> expected = {{KIND_ACCEPTED, handle, 1, {}},
+                                   {KIND_STATE, handle, 2, {}},
+                                   {KIND_STATE, handle, 3, {}},
+                                   {KIND_DATA, handle, 6, {}},
+                                   {KIND_STATE, handle, 0, {}}};
     EXPECT_EQ(expected, calls);
     for (const SCall& call : calls) {
         EXPECT_NE(std::this_thread::get_id(), call.thread);
@@ -46,8 +46,8 @@ TEST_F(PmxSimTest, IdentificationIsATextResultAfterTheAcknowledgement)
 {
     int64_t handle = open("usb::0X0C6F::0154::100001");
     ASSERT_EQ(0, PmxSendCommand(handle, "*idn?\n", 0));
-    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eData; }));
-    std::vector<SCall> expected = {{eAccepted, handle, 1, {}}, {eData, handle, 10, {}}};
+    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == KIND_DATA; }));
+    std::vector<SCall> expected = {{KIND_ACCEPTED, handle, 1, {}}, {KIND_DATA, handle, 10, {}}};
     EXPECT_EQ(expected, m_aRecorder.calls());
     char text[64];
     EXPECT_EQ(PMXSIM_E_TYPE_MISMATCH, PmxGetFloatResult(handle, nullptr, nullptr, nullptr));
@@ -73,9 +73,9 @@ TEST_F(PmxSimTest, UnknownAndIgnoredCommandsReportErrorsBeforeTheAcknowledgement
     command(handle, "bogus:command");
     command(handle, "init:cont off");
     command(handle, "func sideways");
-    std::vector<SCall> expected = {{eError, handle, PMX_ERR_UNKNOWN_COMMAND, {}},  {eAccepted, handle, 1, {}},
-                                   {eError, handle, PMX_INFO_COMMAND_IGNORED, {}}, {eAccepted, handle, 2, {}},
-                                   {eError, handle, PMX_ERR_UNKNOWN_COMMAND, {}},  {eAccepted, handle, 3, {}}};
+    std::vector<SCall> expected = {{KIND_ERROR, handle, PMX_ERR_UNKNOWN_COMMAND, {}},  {KIND_ACCEPTED, handle, 1, {}},
+                                   {KIND_ERROR, handle, PMX_INFO_COMMAND_IGNORED, {}}, {KIND_ACCEPTED, handle, 2, {}},
+                                   {KIND_ERROR, handle, PMX_ERR_UNKNOWN_COMMAND, {}},  {KIND_ACCEPTED, handle, 3, {}}};
     EXPECT_EQ(expected, m_aRecorder.calls());
     int32_t state = -1;
     EXPECT_EQ(0, PmxGetTriggerState(handle, &state));
@@ -113,7 +113,7 @@ TEST_F(PmxSimTest, PowerMeterSettingsAnswerTheirQueriesAndRefuseBadParameters)
         command(handle, bad);
     size_t refused = 0;
     for (const SCall& c : m_aRecorder.calls())
-        refused += c.kind == eError && c.value == PMX_ERR_UNKNOWN_COMMAND ? 1 : 0;
+        refused += c.kind == KIND_ERROR && c.value == PMX_ERR_UNKNOWN_COMMAND ? 1 : 0;
     EXPECT_EQ(sizeof BAD_COMMANDS / sizeof BAD_COMMANDS[0], refused);
     // A refused command sets the command-error bit; reading the register clears it.
     EXPECT_EQ("32", ask(handle, "*esr?"));
@@ -154,13 +154,13 @@ TEST_F(PmxSimTest, TraceFunctionAndContinuousMeasurement)
     command(handle, ":FUNCtion \"TRACe\"");
     command(handle, "trac:poin 8");
     command(handle, "INITiate:CONTinuous ON");
-    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eData; }, 3));
+    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == KIND_DATA; }, 3));
     // A second start while running is ignored with the benign notice.
     command(handle, "init");
     ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.value == PMX_INFO_COMMAND_IGNORED; }));
     command(handle, "init:cont 0");
-    ASSERT_TRUE(
-        m_aRecorder.waitFor([&](const SCall& c) { return c.kind == eState && c.value == 0 && c.handle == handle; }));
+    ASSERT_TRUE(m_aRecorder.waitFor(
+        [&](const SCall& c) { return c.kind == KIND_STATE && c.value == 0 && c.handle == handle; }));
 
     int32_t type = -1, count = -1, pending = -1;
     ASSERT_EQ(0, PmxGetData(handle, &type, &count, &pending));

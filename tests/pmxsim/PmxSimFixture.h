@@ -21,7 +21,7 @@ namespace PmxSimTesting {
 
 using LbTests::DEADLINE;
 
-enum EKind { eAccepted, eState, eData, eError, eDevice };
+enum EKind { KIND_ACCEPTED, KIND_STATE, KIND_DATA, KIND_ERROR, KIND_DEVICE };
 
 struct SCall {
     EKind kind;
@@ -87,23 +87,23 @@ private:
 
 inline void onAccepted(int64_t h, int32_t v, void* user)
 {
-    static_cast<CRecorder*>(user)->add(eAccepted, h, v);
+    static_cast<CRecorder*>(user)->add(KIND_ACCEPTED, h, v);
 }
 inline void onState(int64_t h, int32_t v, void* user)
 {
-    static_cast<CRecorder*>(user)->add(eState, h, v);
+    static_cast<CRecorder*>(user)->add(KIND_STATE, h, v);
 }
 inline void onData(int64_t h, int32_t v, void* user)
 {
-    static_cast<CRecorder*>(user)->add(eData, h, v);
+    static_cast<CRecorder*>(user)->add(KIND_DATA, h, v);
 }
 inline void onError(int64_t h, int32_t v, void* user)
 {
-    static_cast<CRecorder*>(user)->add(eError, h, v);
+    static_cast<CRecorder*>(user)->add(KIND_ERROR, h, v);
 }
 inline void onDevice(void* user)
 {
-    static_cast<CRecorder*>(user)->add(eDevice, 0, 0);
+    static_cast<CRecorder*>(user)->add(KIND_DEVICE, 0, 0);
 }
 
 inline void registerAll(CRecorder* recorder)
@@ -117,7 +117,7 @@ inline void registerAll(CRecorder* recorder)
 
 inline bool isAccepted(const SCall& c)
 {
-    return c.kind == eAccepted;
+    return c.kind == KIND_ACCEPTED;
 }
 
 class PmxSimTest : public ::testing::Test {
@@ -138,10 +138,10 @@ protected:
         return handle;
     }
     // Sends a command and waits for its acknowledgement.
-    void command(int64_t handle, const char* text) { sendAndWait(handle, text, eAccepted); }
+    void command(int64_t handle, const char* text) { sendAndWait(handle, text, KIND_ACCEPTED); }
     // Sends a command and waits for its next result; the oldest pending result stays for the
     // caller to take.
-    void awaitResult(int64_t handle, const char* text) { sendAndWait(handle, text, eData); }
+    void awaitResult(int64_t handle, const char* text) { sendAndWait(handle, text, KIND_DATA); }
     // Sends a command and waits for the next callback of `kind` for the handle.
     void sendAndWait(int64_t handle, const char* text, EKind kind)
     {

@@ -30,7 +30,7 @@ TEST_F(PmxSimTest, EveryDataTypeIsDeliveredWithTheQueuedValues)
         if (type == PMXSIM_TYPE_TEXT)
             values = "abc";
         ASSERT_EQ(0, PmxSimQueueResult("100000", type, values, queued));
-        ASSERT_TRUE(m_aRecorder.waitFor([&](const SCall& c) { return c.kind == eData && c.value == type; }));
+        ASSERT_TRUE(m_aRecorder.waitFor([&](const SCall& c) { return c.kind == KIND_DATA && c.value == type; }));
 
         int32_t reported = -1, count = -1, pending = -1;
         ASSERT_EQ(0, PmxGetData(handle, &reported, &count, &pending));
@@ -89,8 +89,8 @@ TEST_F(PmxSimTest, NullCallbackStopsThatCallbackOnly)
     int64_t handle = open();
     ASSERT_EQ(0, PmxSetNotifyCallbackCommandAccepted(nullptr, nullptr));
     ASSERT_EQ(0, PmxSendCommand(handle, "*idn?", 0));
-    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eData; }));
-    std::vector<SCall> expected = {{eData, handle, 10, {}}};
+    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == KIND_DATA; }));
+    std::vector<SCall> expected = {{KIND_DATA, handle, 10, {}}};
     EXPECT_EQ(expected, m_aRecorder.calls());
 }
 
@@ -103,11 +103,11 @@ TEST_F(PmxSimTest, ControlFunctionsFireTheirCallbacks)
     ASSERT_EQ(0, PmxSimAttach("PMX-M33", "200"));
     ASSERT_EQ(0, PmxSimSetDeviceFlag("200", 0));
     ASSERT_TRUE(m_aRecorder.waitCount(5));
-    std::vector<SCall> expected = {{eState, handle, 3, {}},
-                                   {eError, handle, 0x1234, {}},
-                                   {eError, 0, PMX_INFO_COMMAND_IGNORED, {}},
-                                   {eDevice, 0, 0, {}},
-                                   {eDevice, 0, 0, {}}};
+    std::vector<SCall> expected = {{KIND_STATE, handle, 3, {}},
+                                   {KIND_ERROR, handle, 0x1234, {}},
+                                   {KIND_ERROR, 0, PMX_INFO_COMMAND_IGNORED, {}},
+                                   {KIND_DEVICE, 0, 0, {}},
+                                   {KIND_DEVICE, 0, 0, {}}};
     EXPECT_EQ(expected, m_aRecorder.calls());
     int32_t state = 0;
     ASSERT_EQ(0, PmxGetTriggerState(handle, &state));
@@ -162,7 +162,7 @@ TEST_F(PmxSimTest, DetachMidSessionFailsLaterCallsCleanly)
     int64_t handle = open();
     ASSERT_EQ(0, PmxSimQueueResult("100000", 6, nullptr, 0));
     ASSERT_EQ(0, PmxSimDetach("100000"));
-    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eDevice; }));
+    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == KIND_DEVICE; }));
     int32_t value = 0;
     float f = 0;
     EXPECT_EQ(PMXSIM_E_SENSOR_DETACHED, PmxSendCommand(handle, "*trg", 0));
@@ -251,10 +251,10 @@ TEST_F(PmxSimTest, AcknowledgementsFollowDelayAndSwitch)
     ASSERT_EQ(0, PmxSimSetAutoAck(0));
     ASSERT_EQ(0, PmxSendCommand(handle, "*cls", 0));
     ASSERT_EQ(0, PmxSendCommand(handle, "bogus", 0));
-    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eError; }));
+    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == KIND_ERROR; }));
     size_t accepted = 0;
     for (const SCall& c : m_aRecorder.calls())
-        accepted += c.kind == eAccepted;
+        accepted += c.kind == KIND_ACCEPTED;
     EXPECT_EQ(1u, accepted) << "only the first command was acknowledged";
     EXPECT_EQ(PMXSIM_E_INVALID_ARGUMENT, PmxSimSetDelays(-1, 0));
 }
@@ -320,7 +320,7 @@ TEST_F(PmxSimTest, CallbacksMayCallBackIntoTheLibraryAndCloseIt)
     std::promise<std::pair<int32_t, int32_t>> results; // fetch, close
     CRecorder hooked;
     hooked.m_fnHook = [&](EKind kind, int64_t h, int32_t) {
-        if (kind == eData) {
+        if (kind == KIND_DATA) {
             float value = 0;
             int32_t fetched = PmxGetFloatResult(h, &value, nullptr, nullptr);
             PmxSetNotifyCallbackDataAvailable(nullptr, nullptr);
@@ -386,7 +386,7 @@ TEST_F(PmxSimTest, ConcurrentUseFromSeveralThreads)
     ASSERT_TRUE(m_aRecorder.waitFor(isAccepted, 2 * ROUNDS));
     int32_t lastA = 0, lastB = 0;
     for (const SCall& c : m_aRecorder.calls()) {
-        if (c.kind != eAccepted)
+        if (c.kind != KIND_ACCEPTED)
             continue;
         int32_t& last = c.handle == a ? lastA : lastB;
         EXPECT_EQ(last + 1, c.value);

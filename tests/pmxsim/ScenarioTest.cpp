@@ -111,7 +111,7 @@ TEST_F(ScenarioTest, FileDescribesSensorsMeasurementsAnswersAndFaults)
     EXPECT_NEAR(-30.0f, noisy, 3.0f);
     m_aRecorder.clear();
     ASSERT_EQ(0, PmxSendCommand(second, "meas?", 0));
-    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == eDevice; }));
+    ASSERT_TRUE(m_aRecorder.waitFor([](const SCall& c) { return c.kind == KIND_DEVICE; }));
     EXPECT_EQ(PMXSIM_E_SENSOR_DETACHED, PmxGetData(second, nullptr, nullptr, nullptr));
     EXPECT_EQ(1, sensors());
 

@@ -10,17 +10,17 @@ CLineReader::EResult CLineReader::next(std::string& line)
     std::size_t length = end == std::string::npos ? m_strBuffer.size() : end;
     if (std::memchr(m_strBuffer.data(), '\0', length) != nullptr || length > MAX_LINE) {
         m_strBuffer.clear();
-        return Malformed;
+        return RESULT_MALFORMED;
     }
     if (end == std::string::npos) {
-        return NeedMore;
+        return RESULT_NEED_MORE;
     }
     line.assign(m_strBuffer, 0, end);
     m_strBuffer.erase(0, end + 1);
     if (!line.empty() && line.back() == '\r') {
         line.pop_back();
     }
-    return Line;
+    return RESULT_LINE;
 }
 
 bool isQuery(const std::string& line)

@@ -13,7 +13,7 @@ constexpr std::size_t MAX_LINE = 65536;
 
 class CLineReader {
 public:
-    enum EResult { Line, NeedMore, Malformed };
+    enum EResult { RESULT_LINE, RESULT_NEED_MORE, RESULT_MALFORMED };
     // Adds received bytes.
     void feed(const char* data, std::size_t size) { m_strBuffer.append(data, size); }
     // Takes the next complete line out of what was fed.

@@ -47,7 +47,7 @@ void serveSocket(CGateway& gateway, unsigned index, CConnection& connection, CLa
     char buffer[4096];
     for (;;) {
         CLineReader::EResult result;
-        while ((result = reader.next(line)) == CLineReader::Line) {
+        while ((result = reader.next(line)) == CLineReader::RESULT_LINE) {
             if (line.empty())
                 continue;
             std::string command = line + "\n";
@@ -61,7 +61,7 @@ void serveSocket(CGateway& gateway, unsigned index, CConnection& connection, CLa
                     return;
             }
         }
-        if (result == CLineReader::Malformed) {
+        if (result == CLineReader::RESULT_MALFORMED) {
             static const char text[] = "ERROR: malformed input\n";
             connection.writeAll(text, sizeof text - 1);
             log.line("socket inst%u: %s sent malformed input, connection closed", index, connection.peerText().c_str());

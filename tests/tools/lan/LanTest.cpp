@@ -64,19 +64,19 @@ TEST(LanLines, SplitsLinesAndRefusesMalformedInput)
     CLineReader reader;
     std::string line;
     reader.feed("*IDN?\r\nFUNC PO", 14);
-    ASSERT_EQ(CLineReader::Line, reader.next(line));
+    ASSERT_EQ(CLineReader::RESULT_LINE, reader.next(line));
     EXPECT_EQ("*IDN?", line);
-    EXPECT_EQ(CLineReader::NeedMore, reader.next(line));
+    EXPECT_EQ(CLineReader::RESULT_NEED_MORE, reader.next(line));
     reader.feed("WER\n", 4);
-    ASSERT_EQ(CLineReader::Line, reader.next(line));
+    ASSERT_EQ(CLineReader::RESULT_LINE, reader.next(line));
     EXPECT_EQ("FUNC POWER", line);
 
     reader.feed("a\0b\n", 4);
-    EXPECT_EQ(CLineReader::Malformed, reader.next(line));
+    EXPECT_EQ(CLineReader::RESULT_MALFORMED, reader.next(line));
     CLineReader longLine;
     std::string big(MAX_LINE + 1, 'x');
     longLine.feed(big.data(), big.size());
-    EXPECT_EQ(CLineReader::Malformed, longLine.next(line));
+    EXPECT_EQ(CLineReader::RESULT_MALFORMED, longLine.next(line));
 
     EXPECT_TRUE(isQuery("SYST:ERR?"));
     EXPECT_FALSE(isQuery("DISP:TEXT \"why?\""));
