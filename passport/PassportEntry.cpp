@@ -284,8 +284,8 @@ void detachProcess(EDetach kind)
         // Nothing may run in the module once its static objects go: the sessions the application
         // left open are closed as by viClose, which stops their event threads and closes their
         // sensors and, with the last one, the driver (joining the library's thread). A driver
-        // that would not close keeps no callback.
-        // The passport lock is not re-entrant and viClose takes it itself.
+        // that would not close keeps no callback. viClose takes the passport lock itself, which
+        // is not re-entrant, so it is held only around the list.
         std::vector<CBasePassport*> objects;
         {
             CPassportLock lock;

@@ -5,8 +5,6 @@
 #include "sensor/PmxSession.h"
 #include "sensor/PmxSessionDispatcher.h"
 
-#include <sstream>
-
 namespace LbPmxVisa {
 
 static LbCore::CLogger s_cLogger = LbCore::CLogManager::getLogger("CPmxErrorQueue");
@@ -26,16 +24,12 @@ CPmxErrorQueue::~CPmxErrorQueue() { }
 void CPmxErrorQueue::serialize(CPmxDataBuffer& buffer) const
 {
     LbCore::CLock<LbCore::CCriticalSection> lock(m_cLock);
-    std::ostringstream text;
     if (m_cEntries.empty()) {
-        text << 0 << ", \""
-             << "No Error"
-             << "\"";
-        buffer.write(text.str());
+        buffer.write(std::string("0, \"No Error\""));
         return;
     }
-    text << m_cEntries.back().first << ", \"" << m_cEntries.back().second << "\"";
-    buffer.write(text.str());
+    const std::pair<std::int32_t, std::string>& entry = m_cEntries.back();
+    buffer.write(std::to_string(entry.first) + ", \"" + entry.second + "\"");
     m_cEntries.pop_back();
 }
 

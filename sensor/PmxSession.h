@@ -109,6 +109,8 @@ private:
     void takeAcknowledgement();
     // Throws away every message no writer has taken, without delivering it.
     void clearMessages();
+    // Queues a notification's message for the writer; a message that could not be made is logged.
+    void queueMessage(CPmxSessionMessage* message);
     // Gives up a kept reply (under the busy flag).
     void dropReply();
     // Whether the library still lists this sensor; throws when the list cannot be read whole.

@@ -13,16 +13,16 @@ namespace LbPmxVisa {
 
 static LbCore::CLogger s_cLogger = LbCore::CLogManager::getLogger("CPmxSession");
 
-namespace {
-
 // A notification runs on the event thread and must not fail there: without memory for the
 // message the waiting writer simply sees no answer and ends at its time-out.
-void logLostMessage(const CPmxSession* session)
+void CPmxSession::queueMessage(CPmxSessionMessage* message)
 {
-    s_cLogger.error("LbPmxVisa::CPmxSession::notify") << "Could not create a message for session " << session;
+    if (message == nullptr) {
+        s_cLogger.error("LbPmxVisa::CPmxSession::notify") << "Could not create a message for session " << this;
+        return;
+    }
+    m_cMessageQueue.push(message, 0);
 }
-
-} // namespace
 
 bool CPmxSession::isSensorAttached()
 {
@@ -59,12 +59,7 @@ void CPmxSession::notifyCommandAcceptedEvent(const CPmxEvent&)
     public:
         void deliver() override { }
     };
-    CPmxSessionMessage* message = new (std::nothrow) CPmxCommandAcceptedEventMessage();
-    if (message == nullptr) {
-        logLostMessage(this);
-        return;
-    }
-    m_cMessageQueue.push(message, 0);
+    queueMessage(new (std::nothrow) CPmxCommandAcceptedEventMessage());
 }
 
 void CPmxSession::notifyDataAvailableEvent(const CPmxEvent&)
@@ -82,12 +77,7 @@ void CPmxSession::notifyErrorOccuredEvent(const CPmxEvent& event)
     private:
         CPmxEvent m_cEvent;
     };
-    CPmxSessionMessage* message = new (std::nothrow) CPmxCommandErrorEventMessage(event);
-    if (message == nullptr) {
-        logLostMessage(this);
-        return;
-    }
-    m_cMessageQueue.push(message, 0);
+    queueMessage(new (std::nothrow) CPmxCommandErrorEventMessage(event));
 }
 
 void CPmxSession::notifyStateChangedEvent(const CPmxEvent&) { }
@@ -117,12 +107,7 @@ void CPmxSession::notifyDeviceChangedEvent(const CPmxEvent&)
     clearMessages();
     if (removed) {
         m_bSensorRemoved = true;
-        CPmxSessionMessage* message = new (std::nothrow) CPmxSensorRemovedMessage();
-        if (message == nullptr) {
-            logLostMessage(this);
-        } else {
-            m_cMessageQueue.push(message, 0);
-        }
+        queueMessage(new (std::nothrow) CPmxSensorRemovedMessage());
     }
     s_cLogger.warn("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent")
         << "Device has been changed for session " << this;

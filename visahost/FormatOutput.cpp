@@ -61,7 +61,7 @@ public:
             nPrecision = va_arg(m_sArgs.m_ap, int);
         if (bBinary)
             return binary(s, nWidth);
-        // The C library's own spec for one element: flags, width, precision, conversion.
+        // The C library's own conversion for one element: flags, width, precision, code.
         std::string strSpec = "%" + s.m_strFlags;
         if (nWidth >= 0)
             strSpec += std::to_string(nWidth);
