@@ -32,10 +32,9 @@ PY
   passed=$((passed + ${counts% *})); failed=$((failed + ${counts#* }))
 }
 
-if [ ! -d "$WINEPREFIX" ]; then
-  echo "== creating the Wine prefix"
-  wineboot -i >/dev/null 2>&1 || wine wineboot -i >/dev/null 2>&1 || true
-fi
+# shellcheck source=scripts/checks/lib/wine-prefix.sh
+source scripts/checks/lib/wine-prefix.sh
+ensure_wine_prefix || failed=$((failed + 1))
 # One persistent Wine server for the whole run, with Wine's own service processes started here,
 # their output detached: started by the first Windows test instead, they could inherit that
 # test's output pipes and make CTest wait.

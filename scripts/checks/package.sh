@@ -131,9 +131,9 @@ done
 
 # --- Windows ZIP under Wine
 export WINEDEBUG=-all WINEPREFIX=$root/build/wineprefix-package
-if [ ! -d "$WINEPREFIX" ]; then
-  wineboot -i >/dev/null 2>&1 </dev/null || wine wineboot -i >/dev/null 2>&1 </dev/null
-fi
+# shellcheck source=scripts/checks/lib/wine-prefix.sh
+source "$root/scripts/checks/lib/wine-prefix.sh"
+ensure_wine_prefix || exit 1
 mkdir -p "$tmp/zip"
 (cd "$tmp/zip" && cmake -E tar xf "$root/$zip") || { echo "FAILED: cannot unpack $zip"; exit 1; }
 top=$(ls -d "$tmp"/zip/*/ | head -n1)
