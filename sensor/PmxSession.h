@@ -80,8 +80,14 @@ public:
     void setTimeout(std::uint64_t timeoutMs) { m_nTimeout = timeoutMs; }
     std::uint32_t getDataFormat() const { return m_nDataFormat; }
     std::int64_t getHandle() const { return m_lHandle; }
-    // True once a device change has shown that the sensor left the library's device list.
+    // True once the sensor is known to have gone: it left the library's device list, or the
+    // library no longer answers for the session's handle.
     bool isSensorRemoved() const { return m_bSensorRemoved; }
+    // Whether the library still answers for the session's handle. A sensor unplugged and plugged
+    // back is listed again under its resource, but with a new handle; the old one is dead.
+    bool isHandleAlive();
+    // Marks the session dead; a writer waiting for an answer is woken with the removal.
+    void markSensorRemoved();
     // Commands sent to the sensor and answers accounted for; equal while nothing is pending.
     std::uint64_t getCommandCount() const { return m_nCommandCount; }
     std::uint64_t getMessageCount() const { return m_nMessageCount; }

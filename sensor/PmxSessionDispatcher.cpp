@@ -98,15 +98,27 @@ boost::shared_ptr<CPmxSession> CPmxSessionDispatcher::getSession(const CPmxResou
         callChecked(&CIPmxCommands::openDriver);
     }
     std::string key = g_pcVisaSerializer->serialize(resource);
-    boost::shared_ptr<CPmxSession> dead; // released outside the map lock
+    boost::shared_ptr<CPmxSession> session;
     {
         CMapGuard guard(m_cMapLock);
         std::unordered_map<std::string, boost::weak_ptr<CPmxSession>>::iterator found = m_cResourceMap.find(key);
         // An expired entry belongs to a session whose destructor is running and has not left
         // the map yet; a new session is made instead of failing with bad_weak_ptr, and the dying
         // one leaves only its own entry (see detach).
-        boost::shared_ptr<CPmxSession> session =
-            found != m_cResourceMap.end() ? found->second.lock() : boost::shared_ptr<CPmxSession>();
+        if (found != m_cResourceMap.end()) {
+            session = found->second.lock();
+        }
+    }
+    // A sensor plugged back before its session heard of the unplug is listed as before, but the
+    // session's handle is dead. Asked outside the map lock: the library's callback thread may be
+    // waiting for it. (Callers serialise getSession, so the entry cannot change meanwhile.)
+    if (session && !session->isSensorRemoved() && !session->isHandleAlive()) {
+        session->markSensorRemoved();
+    }
+    boost::shared_ptr<CPmxSession> dead; // released outside the map lock
+    {
+        CMapGuard guard(m_cMapLock);
+        std::unordered_map<std::string, boost::weak_ptr<CPmxSession>>::iterator found = m_cResourceMap.find(key);
         // A session whose sensor was removed stays with the VISA sessions that hold it, dead; a
         // re-attached sensor gets a new one. The dead one leaves both maps now (no event names
         // its handle any more); its destructor then finds nothing of its own to remove.
@@ -116,7 +128,9 @@ boost::shared_ptr<CPmxSession> CPmxSessionDispatcher::getSession(const CPmxResou
             if (byHandle != m_cSessionMap.end() && byHandle->second == session.get()) {
                 m_cSessionMap.erase(byHandle);
             }
-            m_cResourceMap.erase(found);
+            if (found != m_cResourceMap.end()) {
+                m_cResourceMap.erase(found);
+            }
             dead.swap(session);
         }
         if (session) {
@@ -126,7 +140,7 @@ boost::shared_ptr<CPmxSession> CPmxSessionDispatcher::getSession(const CPmxResou
         }
     }
     // No map lock while the library is called: its callback thread may be waiting for it.
-    boost::shared_ptr<CPmxSession> session(new CPmxSession(this, resource));
+    session.reset(new CPmxSession(this, resource));
     session->open();
     {
         CMapGuard guard(m_cMapLock);

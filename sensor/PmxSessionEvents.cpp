@@ -53,6 +53,24 @@ bool CPmxSession::isSensorAttached()
     return false;
 }
 
+bool CPmxSession::isHandleAlive()
+{
+    std::int32_t trigger = 0;
+    return getParent()->getCommands()->getTriggerState(*this, &trigger) == 0;
+}
+
+void CPmxSession::markSensorRemoved()
+{
+    class CPmxSensorRemovedMessage : public CPmxSessionMessage {
+    public:
+        void deliver() override { throw CPmxSensorRemovedException(); }
+    };
+    clearMessages();
+    // Set before the removal message is queued: a writer that misses the message sees the flag.
+    m_bSensorRemoved = true;
+    queueMessage(new (std::nothrow) CPmxSensorRemovedMessage());
+}
+
 void CPmxSession::notifyCommandAcceptedEvent(const CPmxEvent&)
 {
     class CPmxCommandAcceptedEventMessage : public CPmxSessionMessage {
@@ -83,18 +101,15 @@ void CPmxSession::notifyErrorOccuredEvent(const CPmxEvent& event)
 void CPmxSession::notifyStateChangedEvent(const CPmxEvent&) { }
 
 // The notification names no sensor. A session keeps its state while its own sensor is still
-// listed; when the sensor has gone, the session is dead: a waiting writer is woken with the
-// removal. A list that cannot be read leaves the question open, and the session clears itself
-// without being marked dead.
+// listed and its handle still answers; when the sensor has gone (or was plugged back, both
+// changes arriving after it is listed again), the session is dead: a waiting writer is woken
+// with the removal. A list that cannot be read leaves the question open, and the session clears
+// itself without being marked dead.
 void CPmxSession::notifyDeviceChangedEvent(const CPmxEvent&)
 {
-    class CPmxSensorRemovedMessage : public CPmxSessionMessage {
-    public:
-        void deliver() override { throw CPmxSensorRemovedException(); }
-    };
     bool removed = false;
     try {
-        if (isSensorAttached()) {
+        if (isSensorAttached() && isHandleAlive()) {
             s_cLogger.debug("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent")
                 << "Sensor still attached, nothing changes for session " << this;
             return;
@@ -104,10 +119,10 @@ void CPmxSession::notifyDeviceChangedEvent(const CPmxEvent&)
         s_cLogger.warn("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent")
             << "Could not read the device list: " << e.what();
     }
-    clearMessages();
     if (removed) {
-        m_bSensorRemoved = true;
-        queueMessage(new (std::nothrow) CPmxSensorRemovedMessage());
+        markSensorRemoved();
+    } else {
+        clearMessages();
     }
     s_cLogger.warn("LbPmxVisa::CPmxSession::notifyDeviceChangedEvent")
         << "Device has been changed for session " << this;

@@ -226,4 +226,20 @@ TEST_F(Recovery, AReattachedSensorWorksBesideADeadOldSession)
     EXPECT_FALSE(logContains("Session-Map and the Resource-Map are inconsistent!"));
 }
 
+// Plugged back at once, the sensor is listed again before (or while) the session hears of
+// the unplug; whenever the device changes arrive, a new open gets a working session.
+TEST_F(Recovery, ASensorPluggedBackAtOnceIsOpenedAfresh)
+{
+    ViSession old = open(SENSOR);
+    ASSERT_EQ(0, PmxSimDetach("100000"));
+    ASSERT_EQ(0, PmxSimAttach("PMX-M01", "100000"));
+    ViSession fresh = open(SENSOR);
+    ASSERT_EQ(VI_SUCCESS, write(fresh, "*IDN?"));
+    EXPECT_EQ("Marlowe&Tenby,PMX-M01,100000,1.20", read(fresh));
+    EXPECT_EQ(VI_ERROR_SYSTEM_ERROR, write(old, "*IDN?"));
+    EXPECT_EQ(VI_SUCCESS, viClose(old));
+    EXPECT_EQ(VI_SUCCESS, viClose(fresh));
+    EXPECT_FALSE(logContains("Session-Map and the Resource-Map are inconsistent!"));
+}
+
 } // namespace LbPassportTest
