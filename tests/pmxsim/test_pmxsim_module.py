@@ -23,6 +23,8 @@ def test_controls_the_instance_the_visa_runtime_loaded(visa_rm, simulator):
     inst.write_termination = "\n"
     inst.write("FREQ 2e9")
     assert simulator.last_command("4711") == ("freq 2e9\n", 0)
+    inst.write("FREQ " + "0" * 20000 + "1e9")  # longer than the first buffer the module offers
+    assert simulator.last_command("4711") == ("freq " + "0" * 20000 + "1e9\n", 0)
     inst.close()
     simulator.detach("4711")
     assert "LBPMX::0x0004::4711::INSTR" not in visa_rm.list_resources()

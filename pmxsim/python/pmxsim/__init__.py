@@ -37,6 +37,7 @@ DRIVER_NOT_OPEN = _code(0xD0000001)
 INVALID_ARGUMENT = _code(0xD0000002)
 NO_SUCH_SENSOR = _code(0xD0000005)
 SENSOR_DETACHED = _code(0xD0000006)
+BUFFER_TOO_SMALL = _code(0xD000000B)
 SENSOR_NOT_OPEN = _code(0xD000000C)
 ALREADY_ATTACHED = _code(0xD000000D)
 
@@ -102,7 +103,9 @@ class Simulator:
             function.argtypes, function.restype = argtypes, i32
 
     def _call(self, name, *args):
-        code = getattr(self._lib, name)(*args)
+        self._check(name, getattr(self._lib, name)(*args))
+
+    def _check(self, name, code):
         if code != 0:
             raise PmxSimError("%s failed: %s (0x%08X)" % (name, self.error_text(code), code & 0xFFFFFFFF),
                               code)
@@ -155,8 +158,14 @@ class Simulator:
 
     def last_command(self, serial):
         """(text, timeout) of the sensor's last command since it was opened."""
-        text, timeout = ctypes.create_string_buffer(4096), ctypes.c_int32()
-        self._call("PmxSimGetLastCommand", _text(serial), text, len(text), ctypes.byref(timeout))
+        size, timeout = 4096, ctypes.c_int32()
+        while True:  # the library keeps commands of any length; the buffer grows until one fits
+            text = ctypes.create_string_buffer(size)
+            code = self._lib.PmxSimGetLastCommand(_text(serial), text, size, ctypes.byref(timeout))
+            if code != BUFFER_TOO_SMALL or size >= 1 << 30:
+                break
+            size *= 4
+        self._check("PmxSimGetLastCommand", code)
         return text.value.decode(errors="replace"), timeout.value
 
     def set_delays(self, ack_ms, measure_ms):
