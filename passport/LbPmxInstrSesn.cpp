@@ -52,6 +52,10 @@ template <class F> ViStatus guarded(const char* operation, const CStatusMap& map
     } catch (const CPmxSession::CPmxSessionIsBusyException& e) {
         logError(operation, e.what());
         return map.busy;
+    } catch (const CPmxSession::CPmxAbandonedException& e) {
+        // Closed by another thread while waiting: the runtime's waits answer the same.
+        logError(operation, e.what());
+        return VI_ERROR_INV_OBJECT;
     } catch (const CIPmxSessionState::CPmxNoDataAvailableException& e) {
         logError(operation, e.what());
         return map.noData;
@@ -150,9 +154,27 @@ ViStatus CLbPmxInstrSesn::viClose()
     }
     if (m_nClosingFromDestructor == 0) {
         m_nClosed = 1;
-        delete this;
+        if (closeWhenIdle()) {
+            delete this;
+        }
     }
     return VI_SUCCESS;
+}
+
+// A read or write of this session that waits for the sensor ends with CPmxAbandonedException;
+// another VISA session's command on the same sensor goes on.
+void CLbPmxInstrSesn::abandonCalls()
+{
+    if (m_pcSession) {
+        m_pcSession->abandon(this);
+    }
+}
+
+// Releasing the sensor session may close the driver, which is done under the passport lock.
+void CLbPmxInstrSesn::destroyClosed()
+{
+    CPassportLock lock;
+    delete this;
 }
 
 // ---- message-based operations
@@ -164,7 +186,7 @@ ViStatus CLbPmxInstrSesn::viWrite(ViConstBuf buffer, ViUInt32 count, ViPUInt32 r
     }
     return guarded("LbPmxPassport::CLbPmxInstrSesn::viWrite", WRITE_MAP, [&] {
         std::string command(reinterpret_cast<const char*>(buffer), count);
-        m_pcSession->write(command);
+        m_pcSession->write(command, this);
         if (returnCount != nullptr) {
             *returnCount = static_cast<ViUInt32>(command.size());
         }
@@ -180,7 +202,7 @@ ViStatus CLbPmxInstrSesn::viRead(ViPBuf buffer, ViUInt32 count, ViPUInt32 return
     return guarded("LbPmxPassport::CLbPmxInstrSesn::viRead", READ_MAP, [&] {
         std::uint32_t bytes = 0;
         CPmxDataBuffer data(*m_pcSession, reinterpret_cast<char*>(buffer), count, &bytes);
-        m_pcSession->read(data);
+        m_pcSession->read(data, this);
         if (returnCount != nullptr) {
             *returnCount = bytes;
         }
@@ -191,7 +213,7 @@ ViStatus CLbPmxInstrSesn::viRead(ViPBuf buffer, ViUInt32 count, ViPUInt32 return
 ViStatus CLbPmxInstrSesn::viAssertTrigger(ViUInt16)
 {
     return guarded("LbPmxPassport::CLbPmxInstrSesn::viAssertTrigger", TRIGGER_MAP, [&] {
-        m_pcSession->write("*TRG");
+        m_pcSession->write("*TRG", this);
         return VI_SUCCESS;
     });
 }

@@ -5,7 +5,8 @@
 // on it) and translates between VISA conventions (statuses, user buffers, return counts) and
 // the sensor session's strings, data buffers and exceptions. No exception leaves an operation.
 // Its three listeners turn sensor notifications into VISA events on this session.
-// Objects come from the memory pool; viClose (or a failed viOpen) destroys the object.
+// Objects come from the memory pool; viClose (or a failed viOpen) destroys the object, or, with
+// calls in progress, ends their waits and leaves it to the last of them.
 #include "core/MemoryPool.h"
 #include "core/Parent.h"
 #include "sensor/PmxCommands.h"
@@ -92,6 +93,10 @@ public:
     // An open is refused while more than this many sensor sessions exist, so at most one more,
     // MAX_OPEN_BEFORE_OPEN + 1 = 128, can exist at a time.
     static constexpr unsigned MAX_OPEN_BEFORE_OPEN = 127;
+
+protected:
+    void abandonCalls() override;
+    void destroyClosed() override;
 
 private:
     ViStatus getAttribute(ViAttr attribute, void* value);

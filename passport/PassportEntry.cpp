@@ -47,7 +47,11 @@ template <class F> ViStatus forward(ViSession session, F call)
         return VI_ERROR_SYSTEM_ERROR;
     }
     CBasePassport* object = objectOf(session);
-    return object == nullptr ? VI_ERROR_INV_OBJECT : call(*object);
+    if (object == nullptr) {
+        return VI_ERROR_INV_OBJECT;
+    }
+    CBasePassport::CCall inProgress(*object);
+    return call(*object);
 }
 
 ViStatus _VI_FUNC entryFindRsrc(ViSession rm, ViConstString expression, ViPFindList findList)

@@ -10,6 +10,7 @@
 #include <cctype>
 #include <chrono>
 #include <memory>
+#include <new>
 #include <stdexcept>
 
 namespace LbPmxVisa {
@@ -36,7 +37,8 @@ CPmxSession::CPmxSession(CPmxSessionDispatcher* dispatcher, const CPmxResourceIn
       m_pcState(CIPmxSessionState::noData()), m_cStateLock(), m_lHandle(0), m_cEventDispatcher(this),
       m_nCommandCount(0), m_nMessageCount(0), m_lBusy(0), m_cDataSemaphore(0), m_cMessageQueue(10), m_cErrorQueue(this),
       m_nTimeout(5000), m_nDataFormat(0), m_nSuppressEndEnabled(0), m_nSendEndEnabled(1), m_nTermCharEnabled(0),
-      m_nTermChar('\n'), m_bReplyHeld(false), m_bSensorRemoved(false)
+      m_nTermChar('\n'), m_bReplyHeld(false), m_bSensorRemoved(false), m_pvCaller(nullptr),
+      m_bAbandoned(false)
 {
 }
 
@@ -151,14 +153,52 @@ void CPmxSession::dropReply()
     m_cReply.clear();
 }
 
-void CPmxSession::write(const std::string& command)
+CPmxSession::CCallerScope::CCallerScope(CPmxSession& session, const void* caller) : m_rSession(session)
+{
+    LbCore::CMutexLock guard(session.m_cCallerLock);
+    session.m_pvCaller = caller;
+    session.m_bAbandoned = false;
+}
+
+CPmxSession::CCallerScope::~CCallerScope()
+{
+    LbCore::CMutexLock guard(m_rSession.m_cCallerLock);
+    m_rSession.m_pvCaller = nullptr;
+    m_rSession.m_bAbandoned = false;
+}
+
+// The wake-ups stay behind if the command is not waiting: the message is purged by the next
+// write, and a reader that wakes in vain waits again.
+void CPmxSession::abandon(const void* caller)
+{
+    class CPmxAbandonedMessage : public CPmxSessionMessage {
+    public:
+        void deliver() override { throw CPmxAbandonedException(); }
+    };
+    LbCore::CMutexLock guard(m_cCallerLock);
+    if (caller == nullptr || m_pvCaller != caller) {
+        return;
+    }
+    m_bAbandoned = true;
+    queueMessage(new (std::nothrow) CPmxAbandonedMessage());
+    m_cDataSemaphore.release(1);
+}
+
+bool CPmxSession::isAbandoned()
+{
+    LbCore::CMutexLock guard(m_cCallerLock);
+    return m_bAbandoned;
+}
+
+void CPmxSession::write(const std::string& command, const void* caller)
 {
     class CWriteCommand : public CSessionCommand {
     public:
-        explicit CWriteCommand(const std::string& text) : m_sText(text) { }
+        CWriteCommand(const std::string& text, const void* caller) : m_sText(text), m_pvCaller(caller) { }
 
         void execute(CPmxSession& session) override
         {
+            CCallerScope scope(session, m_pvCaller);
             std::string head = m_sText.substr(0, m_sText.find_first_of("\r\n"));
             if (scpiCompare("FETCh?", head.c_str()) == 0) {
                 s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute")
@@ -196,6 +236,9 @@ void CPmxSession::write(const std::string& command)
             if (session.m_bSensorRemoved) {
                 throw CPmxSensorRemovedException();
             }
+            if (session.isAbandoned()) { // its message may have gone with the purge above
+                throw CPmxAbandonedException();
+            }
             CPmxSessionMessage* message = nullptr;
             if (session.m_cMessageQueue.pop(message, toWait(session.m_nTimeout)) != CMessageQueue::RESULT_ITEM) {
                 s_cLogger.info("LbPmxVisa::CPmxSession::write::CWriteCommand::execute")
@@ -221,6 +264,7 @@ void CPmxSession::write(const std::string& command)
 
     private:
         const std::string& m_sText;
+        const void* m_pvCaller;
     };
 
     typedef boost::tokenizer<boost::char_separator<char>> CTokenizer;
@@ -269,7 +313,7 @@ void CPmxSession::write(const std::string& command)
             m_nDataFormat = 1;
             break;
         default: {
-            CWriteCommand writeCommand(token);
+            CWriteCommand writeCommand(token, caller);
             execute(writeCommand);
             break;
         }
@@ -277,14 +321,15 @@ void CPmxSession::write(const std::string& command)
     }
 }
 
-void CPmxSession::read(CPmxDataBuffer& buffer)
+void CPmxSession::read(CPmxDataBuffer& buffer, const void* caller)
 {
     class CReadCommand : public CSessionCommand {
     public:
-        explicit CReadCommand(CPmxDataBuffer& buffer) : m_rBuffer(buffer) { }
+        CReadCommand(CPmxDataBuffer& buffer, const void* caller) : m_rBuffer(buffer), m_pvCaller(caller) { }
 
         void execute(CPmxSession& session) override
         {
+            CCallerScope scope(session, m_pvCaller);
             s_cLogger.debug("LbPmxVisa::CPmxSession::read::CReadCommand::execute")
                 << "Executing GetData(...) method for fetching Pmx-Data for session " << &session;
             CPmxDataBuffer::CSpill& reply = session.m_cReply;
@@ -315,10 +360,11 @@ void CPmxSession::read(CPmxDataBuffer& buffer)
 
     private:
         CPmxDataBuffer& m_rBuffer;
+        const void* m_pvCaller;
     };
 
     s_cLogger.info("LbPmxVisa::CPmxSession::read") << "Reading from session " << this;
-    CReadCommand command(buffer);
+    CReadCommand command(buffer, caller);
     execute(command);
 }
 

@@ -10,13 +10,15 @@
 // A reply that does not fit the reader's buffer is kept whole for the next read (the read still
 // fails with the overflow); writing a command or clearing the device gives it up. A session
 // whose sensor has left the library's device list is dead: a waiting write fails at once, and
-// the dispatcher no longer hands it out.
+// the dispatcher no longer hands it out. A caller that gives up (its VISA session is closing)
+// ends the wait of its own read or write with abandon; another caller's command goes on.
 #include "core/Command.h"
 #include "core/Lock.h"
 #include "core/Log.h"
 #include "core/Parent.h"
 #include "core/Queue.h"
 #include "core/Semaphore.h"
+#include "core/ThreadSafety.h"
 #include "sensor/PmxCommands.h"
 #include "sensor/PmxDataBuffer.h"
 #include "sensor/PmxErrorQueue.h"
@@ -64,12 +66,23 @@ public:
         const char* what() const noexcept override { return "The sensor of this session has been removed"; }
     };
 
+    class CPmxAbandonedException : public std::exception {
+    public:
+        const char* what() const noexcept override { return "The operation was abandoned: its session is closing"; }
+    };
+
     CPmxSession(CPmxSessionDispatcher* dispatcher, const CPmxResourceInfo& resource);
     ~CPmxSession() override;
 
     void open();
-    void write(const std::string& command);
-    void read(CPmxDataBuffer& buffer);
+    // `caller` names who runs the command, for abandon; nullptr: nobody can abandon it.
+    void write(const std::string& command, const void* caller = nullptr);
+    void read(CPmxDataBuffer& buffer, const void* caller = nullptr);
+    // Ends the wait of the read or write in progress if `caller` runs it: it throws
+    // CPmxAbandonedException. Anything else (another caller's command, no command) goes on.
+    void abandon(const void* caller);
+    // Whether the command in progress was abandoned; a reader checks it whenever it wakes.
+    bool isAbandoned();
     void readSTB(std::uint16_t* status);
     void clear();
 
@@ -110,6 +123,18 @@ public:
     void serialize(LbCore::CLogMessage& message) const override;
 
 private:
+    // Names the caller of the command in progress while the command runs (under the busy flag).
+    class CCallerScope {
+    public:
+        CCallerScope(CPmxSession& session, const void* caller);
+        ~CCallerScope();
+        CCallerScope(const CCallerScope&) = delete;
+        CCallerScope& operator=(const CCallerScope&) = delete;
+
+    private:
+        CPmxSession& m_rSession;
+    };
+
     void execute(const CSessionCommand& command) override;
     // After a refused command: waits up to the time-out for the command's acknowledgement.
     void takeAcknowledgement();
@@ -155,6 +180,9 @@ private:
     CPmxDataBuffer::CSpill m_cReply;
     std::atomic<bool> m_bReplyHeld;
     std::atomic<bool> m_bSensorRemoved;
+    LbCore::CMutex m_cCallerLock;
+    const void* m_pvCaller GUARDED_BY(m_cCallerLock);
+    bool m_bAbandoned GUARDED_BY(m_cCallerLock);
 };
 
 } // namespace LbPmxVisa

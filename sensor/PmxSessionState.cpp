@@ -62,6 +62,9 @@ public:
             if (!session->getDataSemaphore().wait(waitMs)) {
                 throw CPmxNoDataAvailableException();
             }
+            if (session->isAbandoned()) {
+                throw CPmxSession::CPmxAbandonedException();
+            }
             // A count left over from a read that gave up earlier ends the wait while the state
             // is still WaitingForData: then wait again, for a full time-out.
             const CState* current = session->getState();

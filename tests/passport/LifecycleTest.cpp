@@ -1,5 +1,6 @@
 // Library faults at driver and sensor open and close, discovery with an unreadable sensor, failed
 // opens, and processes that end with sessions open, through the VISA C API and PmxSim.
+#include "tests/Waiting.h"
 #include "tests/passport/PassportFixture.h"
 
 #include <atomic>
@@ -155,6 +156,45 @@ TEST_F(Lifecycle, ProcessesEndCleanlyWithSessionsOpen)
               readFile(log).find("Commands interface will be detached, when still some sessions are open. "));
     EXPECT_NE(std::string::npos, readFile(log).find("Session closed successfully"));
     std::remove(log.c_str());
+}
+
+// A read waits on the sensor session that the VISA session holds. Closing another VISA session
+// on the sensor leaves that read alone; closing the reader's own session ends the read, and the
+// sensor session goes only once the read has left it.
+TEST_F(Lifecycle, ClosingASessionEndsItsOwnWaitingReadOnly)
+{
+    ViSession reader = open(FIRST_RESOURCE);
+    ViSession other = open(FIRST_RESOURCE);
+    ASSERT_EQ(VI_SUCCESS, viSetAttribute(reader, VI_ATTR_TMO_VALUE, 60000));
+    auto readInThread = [&](ViStatus* status, std::string* answer, std::atomic<long>* id) {
+        return std::thread([=] {
+            *id = LbTests::currentThreadId();
+            *answer = read(reader, 1024, status);
+        });
+    };
+    ViStatus status = VI_SUCCESS;
+    std::string answer;
+    std::atomic<long> id(-1);
+    std::thread first = readInThread(&status, &answer, &id);
+    ASSERT_TRUE(eventually([&] { return id != -1; }));
+    ASSERT_TRUE(LbTests::waitUntilSleeping(id));
+    EXPECT_EQ(VI_SUCCESS, viClose(other));
+    const float value = 2.5f;
+    ASSERT_EQ(0, PmxSimQueueResult("100000", 6, &value, 1));
+    first.join();
+    EXPECT_EQ(VI_SUCCESS, status);
+    EXPECT_EQ("2.500000e+000", answer);
+
+    id = -1;
+    std::thread second = readInThread(&status, &answer, &id);
+    ASSERT_TRUE(eventually([&] { return id != -1; }));
+    ASSERT_TRUE(LbTests::waitUntilSleeping(id));
+    EXPECT_EQ(VI_SUCCESS, viClose(reader));
+    second.join();
+    EXPECT_EQ(VI_ERROR_INV_OBJECT, status);
+    ViSession again = open(FIRST_RESOURCE);
+    expectWorking(again);
+    EXPECT_EQ(VI_SUCCESS, viClose(again));
 }
 
 } // namespace LbPassportTest
