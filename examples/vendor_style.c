@@ -55,7 +55,7 @@ int main(int argc, char** argv)
     printf("  Measured power: %.3f dBm\n", power);
 
     /* The trace as ASCII: a comma-separated array of floats. */
-    if (failed(vi, viPrintf(vi, "FUNC TRACE\nTRAC:POIN %d\nformat ascii\n", TRACE_POINTS), "setup") ||
+    if (failed(vi, viPrintf(vi, "FUNC TRACE;TRAC:POIN %d;format ascii\n", TRACE_POINTS), "setup") ||
         failed(vi, viPrintf(vi, "INIT\n"), "INIT") || failed(vi, viScanf(vi, "%,#f", &count, trace), "ASCII trace"))
         goto done;
     printf("  ASCII trace: %ld points:", (long)count);
@@ -76,7 +76,7 @@ int main(int argc, char** argv)
         printf(" %.2f", trace[i]);
     printf("\n");
 
-    if (failed(vi, viPrintf(vi, "format ascii\nFUNC POWER\n"), "restore") ||
+    if (failed(vi, viPrintf(vi, "format ascii;FUNC POWER\n"), "restore") ||
         failed(vi, viQueryf(vi, "SYSTem:ERRor?\n", "%255[^\n]", error), "SYSTem:ERRor?"))
         goto done;
     printf("  Error queue: %s\n", error);

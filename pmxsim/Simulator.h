@@ -243,6 +243,8 @@ private:
     void setState(SSensor& sensor, int32_t state) REQUIRES(m_aMutex);
     void runTask(STask& task, Clock::time_point now) REQUIRES(m_aMutex);
     void runCommand(SSensor& sensor, const std::string& text, Clock::time_point now) REQUIRES(m_aMutex);
+    void runMessage(SSensor& sensor, const std::string& text, Clock::time_point now, bool last) REQUIRES(m_aMutex);
+    void acceptCommand(SSensor& sensor) REQUIRES(m_aMutex);
     void applyCommand(SSensor& sensor, const SCommand& command, Clock::time_point now) REQUIRES(m_aMutex);
     void applyStatusCommand(SSensor& sensor, const SCommand& command) REQUIRES(m_aMutex);
     void applySetting(SSensor& sensor, const SCommand& command) REQUIRES(m_aMutex);
@@ -251,7 +253,7 @@ private:
     float reading(const SSensor& sensor, double levelDbm, double spreadDb) REQUIRES(m_aMutex);
     float powerReading(SSensor& sensor) REQUIRES(m_aMutex);
     void addTrace(SSensor& sensor) REQUIRES(m_aMutex);
-    bool answerFromModel(SSensor& sensor, const std::string& text) REQUIRES(m_aMutex);
+    bool answerFromModel(SSensor& sensor, const std::string& text, bool last) REQUIRES(m_aMutex);
     SensorPtr makeSensor(const SSensorModel& model) REQUIRES(m_aMutex);
     void detachLocked(SensorPtr sensor) REQUIRES(m_aMutex); // a copy: it leaves m_aSensors
     void finishMeasurement(SSensor& sensor, Clock::time_point now) REQUIRES(m_aMutex);

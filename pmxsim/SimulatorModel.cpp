@@ -162,11 +162,32 @@ void CSimulator::runTask(STask& task, Clock::time_point now)
     }
 }
 
-// A command is answered when it is due: an error first (if any), then the acceptance (unless
-// switched off), then its effects.
+// A line end ends a program message, so a text may hold several: they run in order, and the
+// text as a whole is accepted once, with its last message.
 void CSimulator::runCommand(SSensor& sensor, const std::string& text, Clock::time_point now)
 {
-    if (answerFromModel(sensor, text))
+    std::string::size_type start = 0;
+    std::string::size_type end;
+    while ((end = text.find('\n', start)) != std::string::npos &&
+           text.find_first_not_of(" \t\r\n", end) != std::string::npos) {
+        runMessage(sensor, text.substr(start, end + 1 - start), now, false);
+        start = end + 1;
+    }
+    runMessage(sensor, text.substr(start), now, true);
+}
+
+void CSimulator::acceptCommand(SSensor& sensor)
+{
+    ++sensor.nCommandCount;
+    if (m_bAutoAck)
+        post(CALLBACK_COMMAND_ACCEPTED, sensor.nHandle, sensor.nCommandCount);
+}
+
+// A message is answered when it is due: an error first (if any), then the acceptance (unless
+// switched off, or not the text's last message), then its effects.
+void CSimulator::runMessage(SSensor& sensor, const std::string& text, Clock::time_point now, bool last)
+{
+    if (answerFromModel(sensor, text, last))
         return;
     SCommand command = parseCommand(text);
     bool starts =
@@ -181,9 +202,8 @@ void CSimulator::runCommand(SSensor& sensor, const std::string& text, Clock::tim
     }
     if (ignored)
         post(CALLBACK_ERROR_OCCURRED, sensor.nHandle, PMX_INFO_COMMAND_IGNORED);
-    ++sensor.nCommandCount;
-    if (m_bAutoAck)
-        post(CALLBACK_COMMAND_ACCEPTED, sensor.nHandle, sensor.nCommandCount);
+    if (last)
+        acceptCommand(sensor);
     if (!ignored)
         applyCommand(sensor, command, now);
 }
@@ -338,7 +358,7 @@ void CSimulator::applySetting(SSensor& sensor, const SCommand& command)
 
 // Answers of the scenario come before the built-in commands: a text, or an error that is
 // reported like a refused command.
-bool CSimulator::answerFromModel(SSensor& sensor, const std::string& text)
+bool CSimulator::answerFromModel(SSensor& sensor, const std::string& text, bool last)
 {
     if (sensor.pModel->answers.empty())
         return false;
@@ -350,9 +370,8 @@ bool CSimulator::answerFromModel(SSensor& sensor, const std::string& text)
             sensor.nEventStatus |= EVENT_COMMAND_ERROR;
             post(CALLBACK_ERROR_OCCURRED, sensor.nHandle, answer.nCode);
         }
-        ++sensor.nCommandCount;
-        if (m_bAutoAck)
-            post(CALLBACK_COMMAND_ACCEPTED, sensor.nHandle, sensor.nCommandCount);
+        if (last)
+            acceptCommand(sensor);
         if (!answer.bError)
             addText(sensor, answer.strAnswer);
         return true;

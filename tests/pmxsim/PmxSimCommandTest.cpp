@@ -80,6 +80,14 @@ TEST_F(PmxSimTest, UnknownAndIgnoredCommandsReportErrorsBeforeTheAcknowledgement
     int32_t state = -1;
     EXPECT_EQ(0, PmxGetTriggerState(handle, &state));
     EXPECT_EQ(0, state);
+
+    // A line end ends a program message: every line runs, the text is accepted once.
+    m_aRecorder.clear();
+    command(handle, "bogus\r\ntrac:poin 16\nfunc trace\n\n");
+    expected = {{KIND_ERROR, handle, PMX_ERR_UNKNOWN_COMMAND, {}}, {KIND_ACCEPTED, handle, 4, {}}};
+    EXPECT_EQ(expected, m_aRecorder.calls());
+    EXPECT_EQ("16", ask(handle, "trac:poin?"));
+    EXPECT_EQ("TRACE", ask(handle, "func?"));
 }
 
 TEST_F(PmxSimTest, PowerMeterSettingsAnswerTheirQueriesAndRefuseBadParameters)
