@@ -168,6 +168,8 @@ ViStatus CRuntime::setAttribute(ViObject nVi, ViAttr nAttr, ViAttrState nValue)
         auto& cHolder = static_cast<CAttributeHolder&>(*pc);
         switch (nAttr) {
         case VI_ATTR_MAX_QUEUE_LENGTH:
+            if (cHolder.m_bQueueFixed)
+                return VI_ERROR_ATTR_READONLY;
             if (nValue == 0 || nValue > 0xFFFFFFFFull)
                 return VI_ERROR_NSUP_ATTR_STATE;
             cHolder.m_nMaxQueue = static_cast<ViUInt32>(nValue);

@@ -214,6 +214,7 @@ ViStatus CRuntime::enableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech,
         return VI_ERROR_INV_OBJECT;
     ViUInt16 nEnabled = pc->m_mapEnabled.count(nType) ? pc->m_mapEnabled[nType] : 0;
     pc->m_mapEnabled[nType] = static_cast<ViUInt16>(nEnabled | nMech);
+    pc->m_bQueueFixed = true;
     return (nEnabled & nMech) == nMech ? VI_SUCCESS_EVENT_EN : VI_SUCCESS;
 }
 

@@ -46,6 +46,8 @@ struct CAttributeHolder : CObject {
     using CObject::CObject;
     ViAttrState m_nUserData GUARDED_BY(g_aRuntimeMutex) = 0;
     ViUInt32 m_nMaxQueue GUARDED_BY(g_aRuntimeMutex) = g_nDefaultMaxQueue;
+    // VI_ATTR_MAX_QUEUE_LENGTH is read-only once the session has enabled an event.
+    bool m_bQueueFixed GUARDED_BY(g_aRuntimeMutex) = false;
 };
 
 struct CRsrcManager : CAttributeHolder {

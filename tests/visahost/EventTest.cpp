@@ -57,6 +57,11 @@ TEST_F(Events, FullQueueDropsNewEvents)
 {
     ASSERT_EQ(VI_SUCCESS, viSetAttribute(m_nVi, VI_ATTR_MAX_QUEUE_LENGTH, 2));
     ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+    // Once an event is enabled the queue length is fixed.
+    EXPECT_EQ(VI_ERROR_ATTR_READONLY, viSetAttribute(m_nVi, VI_ATTR_MAX_QUEUE_LENGTH, 1));
+    ViUInt32 nLength = 0;
+    EXPECT_EQ(VI_SUCCESS, viGetAttribute(m_nVi, VI_ATTR_MAX_QUEUE_LENGTH, &nLength));
+    EXPECT_EQ(2u, nLength);
     ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 5"));
     ViEvent nFirst = 0, nSecond = 0;
     EXPECT_EQ(VI_SUCCESS_QUEUE_NEMPTY, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, &nFirst));
