@@ -85,6 +85,8 @@ struct CSession : CAttributeHolder {
     std::set<ViEventType> m_setDeclared GUARDED_BY(g_aRuntimeMutex);
     std::map<ViEventType, ViUInt16> m_mapEnabled GUARDED_BY(g_aRuntimeMutex);
     std::deque<ViEvent> m_dqQueue GUARDED_BY(g_aRuntimeMutex);
+    // Types of which the full queue dropped an event since the last wait that delivered one.
+    std::set<ViEventType> m_setOverflowed GUARDED_BY(g_aRuntimeMutex);
     std::vector<SHandler> m_vHandlers GUARDED_BY(g_aRuntimeMutex);
     // The last operation the passport failed, for exception events it raises itself.
     ViStatus m_nLastError GUARDED_BY(g_aRuntimeMutex) = VI_ERROR_IO;

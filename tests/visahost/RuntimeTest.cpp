@@ -276,6 +276,7 @@ TEST(StatusDesc, TextsForEveryStatusInUse)
                                  VI_SUCCESS_NESTED_SHARED,
                                  VI_WARN_NULL_OBJECT,
                                  VI_WARN_UNKNOWN_STATUS,
+                                 VI_WARN_QUEUE_OVERFLOW,
                                  VI_ERROR_SYSTEM_ERROR,
                                  VI_ERROR_INV_OBJECT,
                                  VI_ERROR_RSRC_LOCKED,
