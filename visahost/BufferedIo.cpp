@@ -24,9 +24,10 @@ ViStatus sessionKind(ViSession nVi)
 {
     ViSession nRm = VI_NULL;
     ViStatus nStatus = api().getAttribute(nVi, VI_ATTR_RM_SESSION, &nRm);
-    if (nStatus == VI_SUCCESS || nStatus == VI_ERROR_INV_OBJECT)
+    if (nStatus == VI_ERROR_INV_OBJECT)
         return nStatus;
-    return VI_ERROR_NSUP_OPER;
+    // A resource manager is its own resource manager.
+    return nStatus == VI_SUCCESS && nRm != nVi ? VI_SUCCESS : VI_ERROR_NSUP_OPER;
 }
 
 } // namespace
