@@ -24,9 +24,10 @@ ViStatus sessionKind(ViSession nVi)
 {
     ViSession nRm = VI_NULL;
     ViStatus nStatus = api().getAttribute(nVi, VI_ATTR_RM_SESSION, &nRm);
-    if (nStatus == VI_SUCCESS || nStatus == VI_ERROR_INV_OBJECT)
+    if (nStatus == VI_ERROR_INV_OBJECT)
         return nStatus;
-    return VI_ERROR_NSUP_OPER;
+    // A resource manager is its own resource manager.
+    return nStatus == VI_SUCCESS && nRm != nVi ? VI_SUCCESS : VI_ERROR_NSUP_OPER;
 }
 
 } // namespace
@@ -156,10 +157,20 @@ ViStatus CSessionIo::readMore()
     m_strRead.erase(0, m_nReadPos);
     m_nReadPos = 0;
     size_t nOld = m_strRead.size();
-    m_strRead.resize(nOld + m_nReadSize);
+    ViUInt32 nCount = m_nReadSize;
     ViUInt32 nRet = 0;
-    ViStatus nStatus = api().read(m_nVi, reinterpret_cast<ViPBuf>(&m_strRead[nOld]), m_nReadSize, &nRet);
-    m_strRead.resize(nOld + (nStatus < VI_SUCCESS ? 0 : std::min(nRet, m_nReadSize)));
+    ViStatus nStatus = VI_SUCCESS;
+    for (;;) {
+        m_strRead.resize(nOld + nCount);
+        nRet = 0;
+        nStatus = api().read(m_nVi, reinterpret_cast<ViPBuf>(&m_strRead[nOld]), nCount, &nRet);
+        // A device that delivers its answers whole refuses a smaller read and keeps the answer:
+        // this read asks again for twice as much, so that a scan gets any sane answer whole.
+        if (nStatus != VI_ERROR_USER_BUF || nCount >= g_nMaxReadGrowth)
+            break;
+        nCount = nCount > g_nMaxReadGrowth / 2 ? g_nMaxReadGrowth : nCount * 2;
+    }
+    m_strRead.resize(nOld + (nStatus < VI_SUCCESS ? 0 : std::min(nRet, nCount)));
     if (nStatus < VI_SUCCESS) {
         m_nReadStatus = nStatus;
         return nStatus;

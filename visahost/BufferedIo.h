@@ -4,6 +4,8 @@
 // mode, before a formatted read, on viFlush and on viClose. The read buffer holds what viRead
 // delivered for viScanf / viBufRead; it keeps unread bytes for the next call unless its mode is
 // VI_FLUSH_ON_ACCESS. A read that ends with END or the termination character ends a message.
+// A read the device refuses with VI_ERROR_USER_BUF (its answer does not fit) is repeated with
+// twice the count, up to g_nMaxReadGrowth; the buffer size the user set stays as it is.
 // Every operation of a session runs under that session's lock.
 #ifndef LBVISAHOST_BUFFEREDIO_H
 #define LBVISAHOST_BUFFEREDIO_H
@@ -18,6 +20,8 @@
 namespace LbVisaHost {
 
 const ViUInt32 g_nDefaultBufferSize = 4096;
+// A read for a scan grows to this size at most while the device refuses it as too small.
+const ViUInt32 g_nMaxReadGrowth = 64u * 1024 * 1024;
 
 // The session attributes the library keeps: those of the buffers, and whether viReadToFile
 // appends (VI_ATTR_FILE_APPEND_EN).

@@ -115,6 +115,9 @@ ViStatus CRuntime::runtimeAttribute(const PObject& pc, ViAttr nAttr, void* pValu
         return VI_SUCCESS;
     }
     switch (nAttr) {
+    case VI_ATTR_RM_SESSION:
+        store<ViSession>(pValue, pc->m_nHandle); // a resource manager is its own
+        return VI_SUCCESS;
     case VI_ATTR_RSRC_IMPL_VERSION:
         store<ViVersion>(pValue, g_nImplVersion);
         return VI_SUCCESS;
@@ -157,10 +160,11 @@ ViStatus CRuntime::getAttribute(ViObject nVi, ViAttr nAttr, void* pValue)
 
 ViStatus CRuntime::setAttribute(ViObject nVi, ViAttr nAttr, ViAttrState nValue)
 {
+    PSession pcSession;
     {
         LbCore::CMutexLock aGuard(g_aRuntimeMutex);
         PObject pc = find(nVi);
-        PSession pcSession = as<CSession>(pc, EKind::Session);
+        pcSession = as<CSession>(pc, EKind::Session);
         if (!pc || (pcSession && pcSession->m_bClosing))
             return VI_ERROR_INV_OBJECT;
         if (pc->m_eKind == EKind::Event || pc->m_eKind == EKind::FindList)
@@ -168,6 +172,8 @@ ViStatus CRuntime::setAttribute(ViObject nVi, ViAttr nAttr, ViAttrState nValue)
         auto& cHolder = static_cast<CAttributeHolder&>(*pc);
         switch (nAttr) {
         case VI_ATTR_MAX_QUEUE_LENGTH:
+            if (cHolder.m_bQueueFixed)
+                return VI_ERROR_ATTR_READONLY;
             if (nValue == 0 || nValue > 0xFFFFFFFFull)
                 return VI_ERROR_NSUP_ATTR_STATE;
             cHolder.m_nMaxQueue = static_cast<ViUInt32>(nValue);
@@ -187,6 +193,7 @@ ViStatus CRuntime::setAttribute(ViObject nVi, ViAttr nAttr, ViAttrState nValue)
         if (!pcSession) {
             switch (nAttr) {
             case VI_ATTR_RSRC_IMPL_VERSION:
+            case VI_ATTR_RSRC_SPEC_VERSION:
             case VI_ATTR_RSRC_MANF_ID:
             case VI_ATTR_RSRC_MANF_NAME:
                 return VI_ERROR_ATTR_READONLY;
@@ -195,7 +202,20 @@ ViStatus CRuntime::setAttribute(ViObject nVi, ViAttr nAttr, ViAttrState nValue)
             }
         }
     }
-    return route<FSetAttribute>(nVi, "viSetAttribute", true, nAttr, nValue);
+    ViStatus nStatus = route<FSetAttribute>(nVi, "viSetAttribute", true, nAttr, nValue);
+    if (nStatus != VI_ERROR_NSUP_ATTR && nStatus != VI_ERROR_NSUP_OPER)
+        return nStatus;
+    // An interface attribute the runtime answers for the passport (see getAttribute) is
+    // read-only; what the passport answers itself keeps the passport's status.
+    alignas(8) ViChar acValue[1024];
+    ViStatus nGet = route<FGetAttribute>(nVi, "viGetAttribute", false, nAttr, static_cast<void*>(acValue));
+    bool bOwn = (nGet == VI_ERROR_NSUP_ATTR || nGet == VI_ERROR_NSUP_OPER) &&
+        parsedAttribute(*pcSession, nAttr, acValue) == VI_SUCCESS;
+    if (bOwn)
+        return VI_ERROR_ATTR_READONLY;
+    if (nStatus == VI_ERROR_NSUP_ATTR)
+        operationFailed(nVi, nStatus, "viSetAttribute");
+    return nStatus;
 }
 
 ViStatus CRuntime::statusDesc(ViObject, ViStatus nStatus, ViChar szDesc[])

@@ -90,6 +90,7 @@ ViStatus CRuntime::raiseEvent(ViSession nVi, ViEvent nContext, ViUInt32 nMech)
             if (pc->m_dqQueue.size() >= pc->m_nMaxQueue) {
                 // A full queue keeps the events it holds; the new one is lost.
                 nResult = VI_ERROR_QUEUE_OVERFLOW;
+                pc->m_setOverflowed.insert(nType);
             } else {
                 pc->m_dqQueue.push_back(nContext);
                 pc->m_cvChanged.notify_all();
@@ -214,6 +215,7 @@ ViStatus CRuntime::enableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech,
         return VI_ERROR_INV_OBJECT;
     ViUInt16 nEnabled = pc->m_mapEnabled.count(nType) ? pc->m_mapEnabled[nType] : 0;
     pc->m_mapEnabled[nType] = static_cast<ViUInt16>(nEnabled | nMech);
+    pc->m_bQueueFixed = true;
     return (nEnabled & nMech) == nMech ? VI_SUCCESS_EVENT_EN : VI_SUCCESS;
 }
 
@@ -310,10 +312,14 @@ ViStatus CRuntime::waitOnEvent(ViSession nVi, ViEventType nType, ViUInt32 nTimeo
     PEventContext pcEvent = as<CEventContext>(find(nEvent), EKind::Event);
     if (pnOutType)
         *pnOutType = pcEvent->m_nEventType;
+    // The first event of a type delivered after the full queue dropped one of that type says so.
+    bool bOverflowed = pc->m_setOverflowed.erase(pcEvent->m_nEventType) > 0;
     if (pnOutContext)
         *pnOutContext = nEvent;
     else
         erase(nEvent); // nobody can close it later
+    if (bOverflowed)
+        return VI_WARN_QUEUE_OVERFLOW;
     return fMatching() != pc->m_dqQueue.end() ? VI_SUCCESS_QUEUE_NEMPTY : VI_SUCCESS;
 }
 

@@ -106,8 +106,10 @@ ViStatus CRuntime::route(ViSession nVi, const char* szOp, bool bNeedsAccess, A..
         --pc->m_nCalls;
         pc->m_cvChanged.notify_all();
     }
-    // An attribute the passport does not know may still be the runtime's (see getAttribute).
-    bool bRuntimeMayAnswer = nStatus == VI_ERROR_NSUP_ATTR && std::strcmp(szOp, "viGetAttribute") == 0;
+    // An attribute the passport does not know may still be the runtime's (see getAttribute and
+    // setAttribute, which report the failure they end with).
+    bool bRuntimeMayAnswer = nStatus == VI_ERROR_NSUP_ATTR &&
+        (std::strcmp(szOp, "viGetAttribute") == 0 || std::strcmp(szOp, "viSetAttribute") == 0);
     if (nStatus < VI_SUCCESS && !bRuntimeMayAnswer)
         operationFailed(nVi, nStatus, szOp);
     return nStatus;

@@ -46,6 +46,8 @@ struct CAttributeHolder : CObject {
     using CObject::CObject;
     ViAttrState m_nUserData GUARDED_BY(g_aRuntimeMutex) = 0;
     ViUInt32 m_nMaxQueue GUARDED_BY(g_aRuntimeMutex) = g_nDefaultMaxQueue;
+    // VI_ATTR_MAX_QUEUE_LENGTH is read-only once the session has enabled an event.
+    bool m_bQueueFixed GUARDED_BY(g_aRuntimeMutex) = false;
 };
 
 struct CRsrcManager : CAttributeHolder {
@@ -83,6 +85,8 @@ struct CSession : CAttributeHolder {
     std::set<ViEventType> m_setDeclared GUARDED_BY(g_aRuntimeMutex);
     std::map<ViEventType, ViUInt16> m_mapEnabled GUARDED_BY(g_aRuntimeMutex);
     std::deque<ViEvent> m_dqQueue GUARDED_BY(g_aRuntimeMutex);
+    // Types of which the full queue dropped an event since the last wait that delivered one.
+    std::set<ViEventType> m_setOverflowed GUARDED_BY(g_aRuntimeMutex);
     std::vector<SHandler> m_vHandlers GUARDED_BY(g_aRuntimeMutex);
     // The last operation the passport failed, for exception events it raises itself.
     ViStatus m_nLastError GUARDED_BY(g_aRuntimeMutex) = VI_ERROR_IO;

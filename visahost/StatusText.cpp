@@ -38,7 +38,8 @@ const SStatusText g_asTexts[] = {
     {VI_SUCCESS_NESTED_EXCLUSIVE,
      "VI_SUCCESS_NESTED_EXCLUSIVE: Operation completed successfully, and this session has nested exclusive locks."},
     {VI_SUCCESS_SYNC, "VI_SUCCESS_SYNC: Asynchronous operation request was actually performed synchronously."},
-    {VI_WARN_QUEUE_OVERFLOW, "VI_WARN_QUEUE_OVERFLOW: The event queue overflowed; events were lost."},
+    {VI_WARN_QUEUE_OVERFLOW, "VI_WARN_QUEUE_OVERFLOW: The event returned is valid. One or more events that "
+                             "occurred have not been raised because there was no room available on the queue."},
     {VI_WARN_CONFIG_NLOADED,
      "VI_WARN_CONFIG_NLOADED: The specified configuration either does not exist or could not be loaded; using "
      "VISA-specified defaults."},

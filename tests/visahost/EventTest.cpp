@@ -57,13 +57,21 @@ TEST_F(Events, FullQueueDropsNewEvents)
 {
     ASSERT_EQ(VI_SUCCESS, viSetAttribute(m_nVi, VI_ATTR_MAX_QUEUE_LENGTH, 2));
     ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+    // Once an event is enabled the queue length is fixed.
+    EXPECT_EQ(VI_ERROR_ATTR_READONLY, viSetAttribute(m_nVi, VI_ATTR_MAX_QUEUE_LENGTH, 1));
+    ViUInt32 nLength = 0;
+    EXPECT_EQ(VI_SUCCESS, viGetAttribute(m_nVi, VI_ATTR_MAX_QUEUE_LENGTH, &nLength));
+    EXPECT_EQ(2u, nLength);
     ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 5"));
     ViEvent nFirst = 0, nSecond = 0;
-    EXPECT_EQ(VI_SUCCESS_QUEUE_NEMPTY, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, &nFirst));
+    // The first wait after a drop warns, with the event; the warning is given once.
+    EXPECT_EQ(VI_WARN_QUEUE_OVERFLOW, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, &nFirst));
     EXPECT_EQ(VI_SUCCESS, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, &nSecond));
     EXPECT_EQ(nFirst + 1, nSecond); // the first two were kept
     EXPECT_EQ(VI_ERROR_TMO, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
     ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 2"));
+    EXPECT_EQ(VI_SUCCESS_QUEUE_NEMPTY, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
+    ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
     EXPECT_EQ(VI_SUCCESS, viDiscardEvents(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE));
     EXPECT_EQ(VI_SUCCESS_QUEUE_EMPTY, viDiscardEvents(m_nVi, VI_ALL_ENABLED_EVENTS, VI_ALL_MECH));
     EXPECT_EQ(VI_ERROR_TMO, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));

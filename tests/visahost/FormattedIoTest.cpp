@@ -165,6 +165,31 @@ TEST_F(FormattedIo, BuffersMeetTheDevice)
     EXPECT_EQ(VI_ERROR_INV_OBJECT, viFlush(0xDEAD, VI_WRITE_BUF));
 }
 
+TEST_F(FormattedIo, AnswerDeliveredWholeGrowsTheRead)
+{
+    // A device that refuses reads smaller than its answer: scans and buffered reads ask again
+    // with more room until the answer fits; the size the user set stays.
+    std::string strAnswer;
+    for (int i = 0; i < 3000; ++i)
+        strAnswer += std::to_string(i % 10) + ",";
+    strAnswer.back() = '\n';
+    ASSERT_EQ(VI_SUCCESS, write(m_nVi, "WHOLE " + strAnswer));
+    static ViInt32 s_anValues[4000];
+    ViInt32 nCount = 4000;
+    EXPECT_EQ(VI_SUCCESS, viScanf(m_nVi, "%,#d", &nCount, s_anValues));
+    EXPECT_EQ(3000, nCount);
+    EXPECT_EQ(9, s_anValues[2999]);
+    ASSERT_EQ(VI_SUCCESS, viSetBuf(m_nVi, VI_READ_BUF, 100));
+    ASSERT_EQ(VI_SUCCESS, write(m_nVi, "WHOLE " + strAnswer));
+    std::string strRead(8000, '\0');
+    ViUInt32 nRet = 0;
+    EXPECT_EQ(VI_SUCCESS, viBufRead(m_nVi, reinterpret_cast<ViPBuf>(&strRead[0]), 8000, &nRet));
+    EXPECT_EQ(strAnswer, strRead.substr(0, nRet));
+    ViUInt32 nSize = 0;
+    EXPECT_EQ(VI_SUCCESS, viGetAttribute(m_nVi, VI_ATTR_RD_BUF_SIZE, &nSize));
+    EXPECT_EQ(100u, nSize);
+}
+
 TEST_F(FormattedIo, FilesAndAsynchronousJobs)
 {
     const char szFile[] = "visahost_file_io.bin";

@@ -162,6 +162,11 @@ TEST_F(Sessions, AttributesOfRuntimeAndPassport)
     ViVersion nSpec = 0;
     EXPECT_EQ(VI_SUCCESS, viGetAttribute(nVi, VI_ATTR_RSRC_SPEC_VERSION, &nSpec));
     EXPECT_EQ(static_cast<ViVersion>(VI_SPEC_VERSION), nSpec);
+    // Those the runtime answers are read-only; the passport's own attributes keep its answer.
+    const ViAttr anOwn[] = {VI_ATTR_INTF_TYPE, VI_ATTR_INTF_NUM, VI_ATTR_RSRC_CLASS, VI_ATTR_RSRC_SPEC_VERSION};
+    for (ViAttr nAttr : anOwn)
+        EXPECT_EQ(VI_ERROR_ATTR_READONLY, viSetAttribute(nVi, nAttr, 1)) << std::hex << nAttr;
+    EXPECT_EQ(VI_ERROR_NSUP_OPER, viSetAttribute(nVi, VI_ATTR_MANF_ID, 1));
 
     ViChar szText[256] = {};
     ViVersion nVersion = 0;
@@ -173,7 +178,11 @@ TEST_F(Sessions, AttributesOfRuntimeAndPassport)
     EXPECT_EQ(static_cast<ViVersion>(VI_NO_LOCK), nVersion);
     EXPECT_EQ(VI_ERROR_NSUP_ATTR, viGetAttribute(m_nRm, VI_ATTR_TMO_VALUE, &nVersion));
     EXPECT_EQ(VI_ERROR_NSUP_ATTR, viGetAttribute(m_nRm, 0x3FFF7777, &nVersion));
-    EXPECT_EQ(VI_ERROR_ATTR_READONLY, viSetAttribute(m_nRm, VI_ATTR_RSRC_MANF_ID, 1));
+    EXPECT_EQ(VI_SUCCESS, viGetAttribute(m_nRm, VI_ATTR_RM_SESSION, &nRm));
+    EXPECT_EQ(m_nRm, nRm);
+    const ViAttr anReadOnly[] = {VI_ATTR_RSRC_MANF_ID, VI_ATTR_RSRC_SPEC_VERSION, VI_ATTR_RM_SESSION};
+    for (ViAttr nAttr : anReadOnly)
+        EXPECT_EQ(VI_ERROR_ATTR_READONLY, viSetAttribute(m_nRm, nAttr, 1)) << std::hex << nAttr;
     EXPECT_EQ(VI_ERROR_NSUP_ATTR, viSetAttribute(m_nRm, VI_ATTR_TMO_VALUE, 1));
 }
 
@@ -276,6 +285,7 @@ TEST(StatusDesc, TextsForEveryStatusInUse)
                                  VI_SUCCESS_NESTED_SHARED,
                                  VI_WARN_NULL_OBJECT,
                                  VI_WARN_UNKNOWN_STATUS,
+                                 VI_WARN_QUEUE_OVERFLOW,
                                  VI_ERROR_SYSTEM_ERROR,
                                  VI_ERROR_INV_OBJECT,
                                  VI_ERROR_RSRC_LOCKED,

@@ -1,7 +1,8 @@
 // A passport for the runtime's tests, built and loaded like the real one and registered only
 // through the service wrapper. Resources "TEST::1::INSTR" and "TEST::2::INSTR" (VI_ATTR_MANF_ID
 // is the number); reads return what the last write left (VI_SUCCESS_MAX_CNT while some is
-// left); a write "EVENT n" raises n service requests;
+// left); after a write "WHOLE text" reads deliver "text" whole or fail with VI_ERROR_USER_BUF
+// and keep it; a write "EVENT n" raises n service requests;
 // after a write "HANG" a read raises one service request and waits until the session closes;
 // viAssertTrigger, viClear, viTerminate and viSetAttribute are missing on purpose.
 #include <cctype>
@@ -35,6 +36,7 @@ struct SSession {
     std::condition_variable m_cvChanged;
     bool m_bClosed = false;
     int m_nReaders = 0;
+    bool m_bWhole = false; // the answer goes out whole or not at all
 };
 
 void raiseServiceRequest(ViSession vi)
@@ -112,7 +114,7 @@ ViStatus _VI_FUNC tpOpen(ViSession, ViConstRsrc name, ViAccessMode, ViUInt32, Vi
     CNiViSv::acquireLock(g_hLock, 0xFFFFFFFF, 0);
     ViStatus st = VI_ERROR_RSRC_NFOUND;
     if (int n = number(name)) {
-        CNiViSv::sessionRecord(*vi)[2] = new SSession{n, "", {}, {}, {}, false, 0};
+        CNiViSv::sessionRecord(*vi)[2] = new SSession{n, "", {}, {}, {}, false, 0, false};
         const ViEventType anTypes[] = {VI_EVENT_SERVICE_REQ};
         CNiViSv::declareEvents(*vi, 1, anTypes, 0);
         st = CNiViSv::installTable(*vi, g_hTable, 0, *vi, 0);
@@ -141,7 +143,11 @@ ViStatus _VI_FUNC tpWrite(ViSession vi, ViConstBuf buf, ViUInt32 cnt, ViPUInt32 
 {
     if (!buf)
         return VI_ERROR_INV_PARAMETER;
-    object(vi)->m_strData.assign(reinterpret_cast<const char*>(buf), cnt);
+    SSession* ps = object(vi);
+    ps->m_strData.assign(reinterpret_cast<const char*>(buf), cnt);
+    ps->m_bWhole = ps->m_strData.compare(0, 6, "WHOLE ") == 0;
+    if (ps->m_bWhole)
+        ps->m_strData.erase(0, 6);
     if (object(vi)->m_strData.compare(0, 6, "EVENT ") == 0) {
         for (int i = std::atoi(object(vi)->m_strData.c_str() + 6); i > 0; --i)
             raiseServiceRequest(vi);
@@ -167,6 +173,11 @@ ViStatus _VI_FUNC tpRead(ViSession vi, ViPBuf buf, ViUInt32 cnt, ViPUInt32 ret)
     }
     // A read takes what it reads: the rest waits for the next read (VI_SUCCESS_MAX_CNT).
     std::string& str = ps->m_strData;
+    if (ps->m_bWhole && cnt < str.size()) {
+        if (ret)
+            *ret = 0;
+        return VI_ERROR_USER_BUF;
+    }
     ViUInt32 n = cnt < str.size() ? cnt : static_cast<ViUInt32>(str.size());
     std::memcpy(buf, str.data(), n);
     str.erase(0, n);
