@@ -44,6 +44,7 @@ public:
     virtual ViStatus viDisableEvent(ViEventType, ViUInt16) { return VI_ERROR_NSUP_OPER; }
 
 protected:
+    bool isClosed() const { return (m_nCalls.load() & CLOSED) != 0; }
     // For viClose: marks the object closed. True when no call is in progress, and the caller
     // destroys the object now; otherwise the calls' waits have been ended and the last call to
     // leave destroys it.

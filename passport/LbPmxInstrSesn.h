@@ -9,6 +9,7 @@
 // calls in progress, ends their waits and leaves it to the last of them.
 #include "core/MemoryPool.h"
 #include "core/Parent.h"
+#include "sensor/PmxCaller.h"
 #include "sensor/PmxCommands.h"
 #include "passport/BasePassport.h"
 
@@ -20,7 +21,9 @@ class CPmxSession;
 
 namespace LbPmxPassport {
 
-class CLbPmxInstrSesn : public CBasePassport, private LbCore::CMemoryPool::CMemoryPoolManaged {
+class CLbPmxInstrSesn : public CBasePassport,
+                        private LbPmxVisa::CIPmxCaller,
+                        private LbCore::CMemoryPool::CMemoryPoolManaged {
 public:
     using LbCore::CMemoryPool::CMemoryPoolManaged::operator new;
     using LbCore::CMemoryPool::CMemoryPoolManaged::operator delete;
@@ -97,6 +100,7 @@ public:
 protected:
     void abandonCalls() override;
     void destroyClosed() override;
+    bool isClosing() const override { return isClosed(); }
 
 private:
     ViStatus getAttribute(ViAttr attribute, void* value);

@@ -37,7 +37,7 @@ CPmxSession::CPmxSession(CPmxSessionDispatcher* dispatcher, const CPmxResourceIn
       m_pcState(CIPmxSessionState::noData()), m_cStateLock(), m_lHandle(0), m_cEventDispatcher(this),
       m_nCommandCount(0), m_nMessageCount(0), m_lBusy(0), m_cDataSemaphore(0), m_cMessageQueue(10), m_cErrorQueue(this),
       m_nTimeout(5000), m_nDataFormat(0), m_nSuppressEndEnabled(0), m_nSendEndEnabled(1), m_nTermCharEnabled(0),
-      m_nTermChar('\n'), m_bReplyHeld(false), m_bSensorRemoved(false), m_pvCaller(nullptr),
+      m_nTermChar('\n'), m_bReplyHeld(false), m_bSensorRemoved(false), m_pcCaller(nullptr),
       m_bAbandoned(false)
 {
 }
@@ -153,30 +153,35 @@ void CPmxSession::dropReply()
     m_cReply.clear();
 }
 
-CPmxSession::CCallerScope::CCallerScope(CPmxSession& session, const void* caller) : m_rSession(session)
+// A caller marks itself closing before it calls abandon, which takes the same lock: either the
+// scope sees the mark, or abandon sees the caller.
+CPmxSession::CCallerScope::CCallerScope(CPmxSession& session, const CIPmxCaller* caller) : m_rSession(session)
 {
     LbCore::CMutexLock guard(session.m_cCallerLock);
-    session.m_pvCaller = caller;
+    if (caller != nullptr && caller->isClosing()) {
+        throw CPmxAbandonedException();
+    }
+    session.m_pcCaller = caller;
     session.m_bAbandoned = false;
 }
 
 CPmxSession::CCallerScope::~CCallerScope()
 {
     LbCore::CMutexLock guard(m_rSession.m_cCallerLock);
-    m_rSession.m_pvCaller = nullptr;
+    m_rSession.m_pcCaller = nullptr;
     m_rSession.m_bAbandoned = false;
 }
 
 // The wake-ups stay behind if the command is not waiting: the message is purged by the next
 // write, and a reader that wakes in vain waits again.
-void CPmxSession::abandon(const void* caller)
+void CPmxSession::abandon(const CIPmxCaller* caller)
 {
     class CPmxAbandonedMessage : public CPmxSessionMessage {
     public:
         void deliver() override { throw CPmxAbandonedException(); }
     };
     LbCore::CMutexLock guard(m_cCallerLock);
-    if (caller == nullptr || m_pvCaller != caller) {
+    if (caller == nullptr || m_pcCaller != caller) {
         return;
     }
     m_bAbandoned = true;
@@ -190,15 +195,15 @@ bool CPmxSession::isAbandoned()
     return m_bAbandoned;
 }
 
-void CPmxSession::write(const std::string& command, const void* caller)
+void CPmxSession::write(const std::string& command, const CIPmxCaller* caller)
 {
     class CWriteCommand : public CSessionCommand {
     public:
-        CWriteCommand(const std::string& text, const void* caller) : m_sText(text), m_pvCaller(caller) { }
+        CWriteCommand(const std::string& text, const CIPmxCaller* caller) : m_sText(text), m_pcCaller(caller) { }
 
         void execute(CPmxSession& session) override
         {
-            CCallerScope scope(session, m_pvCaller);
+            CCallerScope scope(session, m_pcCaller);
             std::string head = m_sText.substr(0, m_sText.find_first_of("\r\n"));
             if (scpiCompare("FETCh?", head.c_str()) == 0) {
                 s_cLogger.debug("LbPmxVisa::CPmxSession::write::CWriteCommand::execute")
@@ -264,7 +269,7 @@ void CPmxSession::write(const std::string& command, const void* caller)
 
     private:
         const std::string& m_sText;
-        const void* m_pvCaller;
+        const CIPmxCaller* m_pcCaller;
     };
 
     typedef boost::tokenizer<boost::char_separator<char>> CTokenizer;
@@ -321,15 +326,15 @@ void CPmxSession::write(const std::string& command, const void* caller)
     }
 }
 
-void CPmxSession::read(CPmxDataBuffer& buffer, const void* caller)
+void CPmxSession::read(CPmxDataBuffer& buffer, const CIPmxCaller* caller)
 {
     class CReadCommand : public CSessionCommand {
     public:
-        CReadCommand(CPmxDataBuffer& buffer, const void* caller) : m_rBuffer(buffer), m_pvCaller(caller) { }
+        CReadCommand(CPmxDataBuffer& buffer, const CIPmxCaller* caller) : m_rBuffer(buffer), m_pcCaller(caller) { }
 
         void execute(CPmxSession& session) override
         {
-            CCallerScope scope(session, m_pvCaller);
+            CCallerScope scope(session, m_pcCaller);
             s_cLogger.debug("LbPmxVisa::CPmxSession::read::CReadCommand::execute")
                 << "Executing GetData(...) method for fetching Pmx-Data for session " << &session;
             CPmxDataBuffer::CSpill& reply = session.m_cReply;
@@ -360,7 +365,7 @@ void CPmxSession::read(CPmxDataBuffer& buffer, const void* caller)
 
     private:
         CPmxDataBuffer& m_rBuffer;
-        const void* m_pvCaller;
+        const CIPmxCaller* m_pcCaller;
     };
 
     s_cLogger.info("LbPmxVisa::CPmxSession::read") << "Reading from session " << this;

@@ -19,6 +19,7 @@
 #include "core/Queue.h"
 #include "core/Semaphore.h"
 #include "core/ThreadSafety.h"
+#include "sensor/PmxCaller.h"
 #include "sensor/PmxCommands.h"
 #include "sensor/PmxDataBuffer.h"
 #include "sensor/PmxErrorQueue.h"
@@ -76,11 +77,11 @@ public:
 
     void open();
     // `caller` names who runs the command, for abandon; nullptr: nobody can abandon it.
-    void write(const std::string& command, const void* caller = nullptr);
-    void read(CPmxDataBuffer& buffer, const void* caller = nullptr);
-    // Ends the wait of the read or write in progress if `caller` runs it: it throws
+    void write(const std::string& command, const CIPmxCaller* caller = nullptr);
+    void read(CPmxDataBuffer& buffer, const CIPmxCaller* caller = nullptr);
+    // For a caller that is closing now: ends the wait of the read or write it runs, which throws
     // CPmxAbandonedException. Anything else (another caller's command, no command) goes on.
-    void abandon(const void* caller);
+    void abandon(const CIPmxCaller* caller);
     // Whether the command in progress was abandoned; a reader checks it whenever it wakes.
     bool isAbandoned();
     void readSTB(std::uint16_t* status);
@@ -126,7 +127,8 @@ private:
     // Names the caller of the command in progress while the command runs (under the busy flag).
     class CCallerScope {
     public:
-        CCallerScope(CPmxSession& session, const void* caller);
+        // Throws CPmxAbandonedException for a caller that is closing.
+        CCallerScope(CPmxSession& session, const CIPmxCaller* caller);
         ~CCallerScope();
         CCallerScope(const CCallerScope&) = delete;
         CCallerScope& operator=(const CCallerScope&) = delete;
@@ -181,7 +183,7 @@ private:
     std::atomic<bool> m_bReplyHeld;
     std::atomic<bool> m_bSensorRemoved;
     LbCore::CMutex m_cCallerLock;
-    const void* m_pvCaller GUARDED_BY(m_cCallerLock);
+    const CIPmxCaller* m_pcCaller GUARDED_BY(m_cCallerLock);
     bool m_bAbandoned GUARDED_BY(m_cCallerLock);
 };
 

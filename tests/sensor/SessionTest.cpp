@@ -1,6 +1,7 @@
 // Sensor sessions and the session dispatcher against the simulated sensor library: commands
 // and acknowledgements, sensor errors, the busy rule, the status byte, the error queue, session
 // recycling, enumeration, event routing and the driver's lifetime.
+#include "tests/Waiting.h"
 #include "tests/sensor/SimSessionFixture.h"
 
 #include <gtest/gtest.h>
@@ -8,6 +9,7 @@
 #include <boost/shared_ptr.hpp>
 #include <chrono>
 #include <cstdint>
+#include <future>
 #include <stdexcept>
 #include <string>
 #include <thread>
@@ -168,6 +170,38 @@ TEST_F(SessionTest, MissingAcknowledgementEndsTheWriteAfterTheTimeout)
 }
 
 // ---- the busy rule
+
+// A caller that closes ends its own waiting read, never another caller's, and starts nothing new.
+TEST_F(SessionTest, AbandonEndsOnlyItsCallersWaitAndAClosingCallerStartsNothing)
+{
+    class CCaller : public LbPmxVisa::CIPmxCaller {
+    public:
+        bool isClosing() const override { return m_bClosing; }
+        std::atomic<bool> m_bClosing{false};
+    };
+    CPmxSession& session = open();
+    session.setTimeout(60000);
+    CCaller reading;
+    CCaller other;
+    std::promise<long> started;
+    std::thread reader([&] {
+        started.set_value(LbTests::currentThreadId());
+        EXPECT_THROW(read(8192, &reading), CPmxSession::CPmxAbandonedException);
+    });
+    const long id = started.get_future().get();
+    ASSERT_TRUE(LbTests::waitUntilSleeping(id));
+    other.m_bClosing = true;
+    session.abandon(&other); // not the reader's caller: it sleeps on
+    ASSERT_TRUE(LbTests::waitUntilSleeping(id));
+    reading.m_bClosing = true;
+    session.abandon(&reading);
+    reader.join();
+
+    EXPECT_THROW(session.write("*RST", &reading), CPmxSession::CPmxAbandonedException);
+    EXPECT_EQ(0u, session.getCommandCount());
+    session.write("*RST");
+    EXPECT_EQ(1u, session.getCommandCount());
+}
 
 TEST_F(SessionTest, SecondCommandIsRefusedAtOnceWhileStatusAndFormatStillWork)
 {

@@ -123,12 +123,12 @@ protected:
     }
 
     // One read through the session into a buffer of `capacity` bytes; the reply as counted.
-    std::string read(std::size_t capacity = 8192)
+    std::string read(std::size_t capacity = 8192, const LbPmxVisa::CIPmxCaller* caller = nullptr)
     {
         std::vector<char> storage(capacity + 1, '\x7f');
         std::uint32_t count = 0;
         LbPmxVisa::CPmxDataBuffer buffer(session(), storage.data(), capacity, &count);
-        session().read(buffer);
+        session().read(buffer, caller);
         return std::string(storage.data(), count);
     }
 
