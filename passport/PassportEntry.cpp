@@ -1,6 +1,7 @@
 // The passport's boundary with the VISA runtime: the entry functions registered in the vector
 // table, the find callback, process attach/detach and the logging configuration.
 #include "core/Log.h"
+#include "core/ThreadSafety.h"
 #include "passport/LbPmxInstrSesn.h"
 #include "passport/Passport.h"
 #include "sensor/PmxControl.h"
@@ -10,6 +11,8 @@
 #include "sensor/PmxSessionState.h"
 
 #include <atomic>
+#include <chrono>
+#include <condition_variable>
 #include <cstring>
 #include <memory>
 #include <new>
@@ -31,6 +34,28 @@ std::set<CBasePassport*> s_cOpenObjects;
 
 LbCore::CLogger s_cLogger = LbCore::CLogManager::getLogger("CLbPmxInstrSesn");
 
+// Entry calls in progress, so that a process detach lets the calls that its closes abandoned
+// leave (and destroy their objects) before the driver and the module's objects go.
+std::atomic<unsigned> s_nCallsInProgress(0);
+LbCore::CMutex s_cCallsLock;
+std::condition_variable s_cCallsLeft;
+// Bounds that wait: a call stuck in the sensor library must not hold the process's exit.
+const std::chrono::seconds CALLS_LEAVE_WAIT(5);
+
+class CEntryCall {
+public:
+    CEntryCall() { ++s_nCallsInProgress; }
+    ~CEntryCall()
+    {
+        if (--s_nCallsInProgress == 0 && s_bDetached) {
+            LbCore::CMutexLock guard(s_cCallsLock);
+            s_cCallsLeft.notify_all();
+        }
+    }
+    CEntryCall(const CEntryCall&) = delete;
+    CEntryCall& operator=(const CEntryCall&) = delete;
+};
+
 // The object the runtime's record of a session holds in the passport's slot, or null.
 CBasePassport* objectOf(ViSession session)
 {
@@ -50,6 +75,7 @@ template <class F> ViStatus forward(ViSession session, F call)
     if (object == nullptr) {
         return VI_ERROR_INV_OBJECT;
     }
+    CEntryCall counted; // outlives the object's call, which may destroy the object as it leaves
     CBasePassport::CCall inProgress(*object);
     return call(*object);
 }
@@ -123,8 +149,11 @@ ViStatus _VI_FUNC entryClose(ViObject session)
         return VI_SUCCESS;
     }
     {
+        // Closed once: a process detach may be closing the same object right now.
         CPassportLock lock;
-        s_cOpenObjects.erase(object);
+        if (s_cOpenObjects.erase(object) == 0) {
+            return VI_SUCCESS;
+        }
     }
     return object->viClose();
 }
@@ -298,6 +327,10 @@ void detachProcess(EDetach kind)
         }
         for (std::size_t i = 0; i < objects.size(); ++i) {
             objects[i]->viClose();
+        }
+        {
+            std::unique_lock<std::mutex> guard(s_cCallsLock.native());
+            s_cCallsLeft.wait_for(guard, CALLS_LEAVE_WAIT, [] { return s_nCallsInProgress == 0; });
         }
         CPassportLock lock;
         if (getAdapter().isDriverOpen()) {

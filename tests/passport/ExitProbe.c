@@ -1,5 +1,7 @@
 /* Ends its process with sessions open while results keep arriving: opens both simulated sensors,
-   starts continuous measurements, reads one result of each and returns from main.
+   starts continuous measurements, reads one result of each and returns from main. In the
+   "reading" mode the second sensor measures nothing, and another thread waits in viRead on it
+   while main returns.
    The VISA library is loaded at run time, so that the "unload" mode can unload it first; the
    "atexit" mode closes the resource manager from an exit handler registered before the library
    was loaded, which therefore runs after the passport's detach. */
@@ -11,12 +13,23 @@
 
 #if defined(_WIN32)
 #include <windows.h>
+#define startThread(function, argument) CloseHandle(CreateThread(NULL, 0, function, argument, 0, NULL))
+#define THREAD_RESULT DWORD WINAPI
 #define LIBRARY "visa64.dll"
 #define loadLibrary(name) ((void*)LoadLibraryA(name))
 #define symbol(library, name) ((void*)GetProcAddress((HMODULE)(library), name))
 #define unloadLibrary(library) FreeLibrary((HMODULE)(library))
 #else
 #include <dlfcn.h>
+#include <pthread.h>
+#define THREAD_RESULT void*
+static void startThread(void* (*function)(void*), void* argument)
+{
+    pthread_t thread;
+    if (pthread_create(&thread, NULL, function, argument) == 0) {
+        pthread_detach(thread);
+    }
+}
 #define LIBRARY "./libvisa.so"
 #define loadLibrary(name) dlopen(name, RTLD_NOW | RTLD_LOCAL)
 #define symbol(library, name) dlsym(library, name)
@@ -31,6 +44,16 @@ typedef ViStatus(_VI_FUNC* TClose)(ViObject);
 
 static TClose s_pfClose;
 static ViSession s_nRm = VI_NULL;
+
+static TRead s_pfRead;
+
+static THREAD_RESULT waitInRead(void* session)
+{
+    ViByte answer[256];
+    ViUInt32 count = 0;
+    s_pfRead((ViSession)(size_t)session, answer, sizeof answer, &count);
+    return 0;
+}
 
 static void closeResourceManager(void)
 {
@@ -48,6 +71,7 @@ int main(int argc, char** argv)
     TOpen pfOpen;
     TWrite pfWrite;
     TRead pfRead;
+    int sensors = 2;
     int i;
 
     if (strcmp(mode, "atexit") == 0) {
@@ -67,7 +91,16 @@ int main(int argc, char** argv)
         pfOpenDefaultRM(&s_nRm) != VI_SUCCESS) {
         return 3;
     }
-    for (i = 0; i < 2; ++i) {
+    s_pfRead = pfRead;
+    if (strcmp(mode, "reading") == 0) {
+        ViSession session = VI_NULL;
+        if (pfOpen(s_nRm, RESOURCES[1], VI_NULL, 0, &session) != VI_SUCCESS) {
+            return 6;
+        }
+        startThread(waitInRead, (void*)(size_t)session);
+        sensors = 1;
+    }
+    for (i = 0; i < sensors; ++i) {
         ViSession session = VI_NULL;
         ViByte answer[256];
         ViUInt32 count = 0;

@@ -144,7 +144,7 @@ TEST_F(Lifecycle, ProcessesEndCleanlyWithSessionsOpen)
     std::string log = temporaryPath("lbpmx-exit");
     setConfiguration("LOG_LEVEL", "DEBUG");
     setConfiguration("LOG_FILE", log.c_str());
-    for (const char* mode : {"exit", "atexit", "unload"}) {
+    for (const char* mode : {"exit", "atexit", "unload", "reading"}) {
         for (int run = 0; run < runs; ++run) {
             ASSERT_EQ(0, std::system((probe + mode).c_str())) << mode << " run " << run;
         }
