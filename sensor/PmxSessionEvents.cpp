@@ -53,10 +53,12 @@ bool CPmxSession::isSensorAttached()
     return false;
 }
 
+// One failure may be a passing fault of the library; a handle that fails twice in a row is dead.
 bool CPmxSession::isHandleAlive()
 {
+    CIPmxCommands* commands = getParent()->getCommands();
     std::int32_t trigger = 0;
-    return getParent()->getCommands()->getTriggerState(*this, &trigger) == 0;
+    return commands->getTriggerState(*this, &trigger) == 0 || commands->getTriggerState(*this, &trigger) == 0;
 }
 
 void CPmxSession::markSensorRemoved()
