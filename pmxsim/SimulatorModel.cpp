@@ -170,7 +170,9 @@ void CSimulator::runCommand(SSensor& sensor, const std::string& text, Clock::tim
     std::string::size_type end;
     while ((end = text.find('\n', start)) != std::string::npos &&
            text.find_first_not_of(" \t\r\n", end) != std::string::npos) {
-        runMessage(sensor, text.substr(start, end + 1 - start), now, false);
+        std::string message = text.substr(start, end + 1 - start);
+        if (message.find_first_not_of(" \t\r\n") != std::string::npos) // blank lines are no messages
+            runMessage(sensor, message, now, false);
         start = end + 1;
     }
     runMessage(sensor, text.substr(start), now, true);

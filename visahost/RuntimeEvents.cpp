@@ -268,6 +268,11 @@ ViStatus CRuntime::discardEvents(ViSession nVi, ViEventType nType, ViUInt16 nMec
         return VI_ERROR_INV_MECH;
     if (!(nMech & VI_QUEUE))
         return VI_SUCCESS_QUEUE_EMPTY;
+    // The events lost to a full queue go with the discarded ones: no later wait reports them.
+    if (nType == VI_ALL_ENABLED_EVENTS)
+        pc->m_setOverflowed.clear();
+    else
+        pc->m_setOverflowed.erase(nType);
     std::vector<ViEvent> vDiscard;
     for (ViEvent nEvent : pc->m_dqQueue) {
         PEventContext pcEvent = as<CEventContext>(find(nEvent), EKind::Event);
