@@ -142,30 +142,24 @@ bool CLogManager::append(const CLogMessage& message)
 
 // ---- CLogFileAppender
 
-CLogFileAppender::CLogFileAppender(const std::string& path) : m_cFile(path.c_str(), std::ios::out | std::ios::app)
+CLogFileAppender::CLogFileAppender(const std::string& path) : m_cFile(path)
 {
-    if (m_cFile.is_open()) {
+    if (m_cFile.isOpen()) {
         CLogManager::attach(*this);
     }
 }
 
 CLogFileAppender::~CLogFileAppender()
 {
-    if (m_cFile.is_open()) {
+    if (m_cFile.isOpen()) {
         // Detach first: once detached no other thread can be inside append().
         CLogManager::detach(*this);
-        m_cFile.close();
     }
 }
 
 bool CLogFileAppender::append(const CLogMessage& message)
 {
-    if (!m_cFile.is_open()) {
-        return false;
-    }
-    m_cFile << message.getText() << '\n';
-    m_cFile.flush();
-    return m_cFile.good();
+    return m_cFile.appendLine(message.getText());
 }
 
 // ---- CLogger

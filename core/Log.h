@@ -12,6 +12,7 @@
 // at a time, to the appenders.
 #include "core/Command.h"
 #include "core/Lock.h"
+#include "core/LogFile.h"
 #include "core/Parent.h"
 #include "core/Subject.h"
 
@@ -19,7 +20,6 @@
 #include <boost/noncopyable.hpp>
 #include <boost/shared_ptr.hpp>
 #include <exception>
-#include <fstream>
 #include <ostream>
 #include <sstream>
 #include <streambuf>
@@ -65,17 +65,18 @@ private:
     CCriticalSection m_cLock;
 };
 
-// Appends each line to a file (opened in append mode, shared with other processes) and
-// flushes it. A file that cannot be opened leaves the appender detached and silent.
+// Appends each line to a file (opened in append mode, shared with other processes), each line
+// written whole at the end of the file at once. A file that cannot be opened leaves the appender
+// detached and silent.
 class CLogFileAppender : public CILogAppender, private boost::noncopyable {
 public:
     explicit CLogFileAppender(const std::string& path);
     ~CLogFileAppender() override;
     bool append(const CLogMessage& message) override;
-    bool isOpen() const { return m_cFile.is_open(); }
+    bool isOpen() const { return m_cFile.isOpen(); }
 
 private:
-    std::ofstream m_cFile;
+    CLogFile m_cFile;
 };
 
 class CLogger : public CParent<CLogManager> {

@@ -278,6 +278,40 @@ TEST_F(CLogTest, TwoThreadsWriteWholeLines)
     std::remove(path.c_str());
 }
 
+// Two handles on one file, as two processes logging to it have, appending at the same time
+// (driven directly, without the manager's lock): no line is lost or written over.
+TEST_F(CLogTest, TwoAppendersOnOneFileKeepEveryLineWhole)
+{
+    const std::string path = tempPath("shared.log");
+    std::remove(path.c_str());
+    const int LINES = 2000;
+    {
+        CLogFileAppender first(path);
+        CLogFileAppender second(path);
+        ASSERT_TRUE(first.isOpen() && second.isOpen());
+        CLogManager::detach(first);
+        CLogManager::detach(second);
+        auto writer = [&](CLogFileAppender* appender, const char* name) {
+            for (int i = 0; i < LINES; ++i) {
+                CLogMessage message = m_cLogger.info();
+                message << name << " line " << i;
+                appender->append(message);
+            }
+        };
+        std::thread a(writer, &first, "first");
+        std::thread b(writer, &second, "second");
+        a.join();
+        b.join();
+    }
+    std::vector<std::string> lines = readLines(path);
+    ASSERT_EQ(2u * LINES, lines.size());
+    std::regex whole(std::string(LOG_LINE_HEAD) + R"(\[INFO \] CTestLogger - (first|second) line [0-9]+$)");
+    for (const std::string& line : lines) {
+        ASSERT_TRUE(std::regex_search(line, whole)) << line;
+    }
+    std::remove(path.c_str());
+}
+
 TEST_F(CLogTest, ControlCharactersAreWrittenEscapedOnOneLine)
 {
     const std::string forged("FUNC POWER\n01/01/99 00:00:00 [ERROR] forged");
