@@ -43,7 +43,9 @@ bool hasDirectory(const std::string& strPath)
     return strPath.find_first_of("\\/:") != std::string::npos;
 }
 
-// Every subkey of the I/O libraries key whose value "Path" names a module is one passport.
+// Every subkey of the I/O libraries key whose value "Path" names a module is one passport. The
+// value is a string (REG_SZ) or a string with environment variables (REG_EXPAND_SZ), as
+// installers write it; an expanded path that does not fit MAX_PATH is skipped.
 std::vector<std::string> configuredPassports()
 {
     std::vector<std::string> vPaths;
@@ -62,8 +64,16 @@ std::vector<std::string> configuredPassports()
         if (RegOpenKeyExA(hKey, szName, 0, KEY_QUERY_VALUE, &hSub) != ERROR_SUCCESS)
             continue;
         if (RegQueryValueExA(hSub, "Path", nullptr, &nType, reinterpret_cast<BYTE*>(szPath), &nSize) == ERROR_SUCCESS &&
-            nType == REG_SZ && szPath[0] != '\0')
-            vPaths.push_back(szPath);
+            szPath[0] != '\0') {
+            char szExpanded[MAX_PATH + 1] = {};
+            DWORD nExpanded = 0;
+            if (nType == REG_SZ)
+                vPaths.push_back(szPath);
+            else if (nType == REG_EXPAND_SZ &&
+                     (nExpanded = ExpandEnvironmentStringsA(szPath, szExpanded, sizeof szExpanded)) > 0 &&
+                     nExpanded <= sizeof szExpanded)
+                vPaths.push_back(szExpanded);
+        }
         RegCloseKey(hSub);
     }
     RegCloseKey(hKey);
@@ -75,9 +85,12 @@ std::string defaultPassport()
     return "LbViPmx64.dll";
 }
 
+// A passport given with its folder finds the modules it needs (the sensor library) in that
+// folder too, not only beside the application and on PATH.
 bool load(const std::string& strPath, std::string& strError)
 {
-    if (LoadLibraryA(strPath.c_str()))
+    const DWORD nFlags = hasDirectory(strPath) ? LOAD_WITH_ALTERED_SEARCH_PATH : 0;
+    if (LoadLibraryExA(strPath.c_str(), nullptr, nFlags))
         return true;
     strError = "error " + std::to_string(GetLastError());
     return false;

@@ -159,6 +159,16 @@ if [ -s "$tmp/passport.log" ]; then
 else
   fail "no log lines from the registered LOG_LEVEL and LOG_FILE"
 fi
+# Installed elsewhere: the passport and the sensor library in a folder of their own, registered
+# by full path with an environment variable (REG_EXPAND_SZ), as installers write it.
+mkdir -p "$tmp/elsewhere" && mv "${top}bin/LbViPmx64.dll" "${top}bin/PmxControl2_64.dll" "$tmp/elsewhere/" \
+  || fail "cannot move the passport"
+export LB_ELSEWHERE="Z:${tmp//\//\\}\\elsewhere"
+wreg add "$key" /v Path /t REG_EXPAND_SZ /d '%LB_ELSEWHERE%\LbViPmx64.dll' /f \
+  || failreg "cannot register the passport by full path"
+(cd "${top}bin" && timeout 300 wine lbpmx-measure.exe) >"$tmp/wine-elsewhere.log" 2>&1 </dev/null \
+  || fail "the example under Wine with the passport in another folder"
+expect_measurement "Wine, passport in a folder of its own" "$tmp/wine-elsewhere.log"
 wreg import "${top}LbViPmx64-unregister.reg" || failreg "wine reg import LbViPmx64-unregister.reg"
 ! wreg query "$key" || failreg "the key is still there after LbViPmx64-unregister.reg"
 exit $status
