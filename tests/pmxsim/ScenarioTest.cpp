@@ -34,11 +34,16 @@ protected:
     {
         std::string path = testing::TempDir() + "pmxsim_scenario.yaml";
         std::ofstream(path, std::ios::binary) << text;
+        std::string complaint = loadFrom(path);
+        std::remove(path.c_str());
+        return complaint;
+    }
+    std::string loadFrom(const std::string& path)
+    {
         setConfig(path.c_str());
         testing::internal::CaptureStderr();
         EXPECT_EQ(0, PmxSimReset());
         std::string complaint = testing::internal::GetCapturedStderr();
-        std::remove(path.c_str());
         EXPECT_EQ(0, PmxSimSetDelays(0, 0));
         registerAll(&m_aRecorder);
         EXPECT_EQ(0, PmxOpenDriver());
@@ -159,6 +164,17 @@ TEST_F(ScenarioTest, MalformedFileLeavesNoSensorAndNamesLineAndReason)
     ASSERT_FALSE(text.empty());
     EXPECT_EQ("", load(text));
     EXPECT_EQ(3, sensors());
+}
+
+TEST_F(ScenarioTest, UnreadableOrEndlessFileLeavesNoSensor)
+{
+    // /dev/zero never ends: only the first bytes beyond the limit are read.
+    for (std::string path : {std::string("/dev/zero")}) {
+        SCOPED_TRACE(path);
+        EXPECT_EQ("pmxsim: " + path + ": cannot be read (or is larger than 1 MiB); no sensors attached\n",
+                  loadFrom(path));
+        EXPECT_EQ(0, sensors());
+    }
 }
 
 #else
