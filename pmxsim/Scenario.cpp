@@ -33,6 +33,7 @@ bool readFile(const std::string& path, std::string* text)
             break;
         size += got;
     }
+    // A directory opens on POSIX systems, but reading it fails (EISDIR): ferror tells.
     bool failed = std::ferror(file) != 0;
     std::fclose(file);
     text->resize(size);

@@ -168,8 +168,9 @@ TEST_F(ScenarioTest, MalformedFileLeavesNoSensorAndNamesLineAndReason)
 
 TEST_F(ScenarioTest, UnreadableOrEndlessFileLeavesNoSensor)
 {
-    // /dev/zero never ends: only the first bytes beyond the limit are read.
-    for (std::string path : {std::string("/dev/zero")}) {
+    // /dev/zero never ends: only the first bytes beyond the limit are read. A directory opens
+    // but cannot be read.
+    for (std::string path : {std::string("/dev/zero"), testing::TempDir()}) {
         SCOPED_TRACE(path);
         EXPECT_EQ("pmxsim: " + path + ": cannot be read (or is larger than 1 MiB); no sensors attached\n",
                   loadFrom(path));
