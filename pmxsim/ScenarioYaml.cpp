@@ -10,6 +10,7 @@
 #include <cstring>
 #include <initializer_list>
 #include <set>
+#include <vector>
 
 namespace PmxSim {
 
@@ -30,11 +31,13 @@ struct SBad {
     throw SBad{node.Mark().is_null() ? 0 : node.Mark().line + 1, reason};
 }
 
-// The keys of a mapping must come from the allowed set.
+// The keys of a mapping must come from the allowed set, each at most once (the parser keeps a
+// repeated key, and a lookup would silently find its first value).
 void expectMap(const YAML::Node& node, const std::string& what, std::initializer_list<const char*> allowed)
 {
     if (!node.IsMap())
         fail(node, what + " must be a mapping");
+    std::set<std::string> seen;
     for (const auto& item : node) {
         std::string key = item.first.IsScalar() ? item.first.Scalar() : std::string();
         bool known = false;
@@ -42,6 +45,8 @@ void expectMap(const YAML::Node& node, const std::string& what, std::initializer
             known = known || key == name;
         if (!known)
             fail(item.first, "unknown key \"" + key + "\" in " + what);
+        if (!seen.insert(key).second)
+            fail(item.first, "repeated key \"" + key + "\" in " + what);
     }
 }
 
@@ -252,7 +257,10 @@ bool parseScenario(const std::string& input, SScenario* scenario, int* line, std
 {
     SScenario parsed;
     try {
-        readScenario(YAML::Load(input), &parsed);
+        std::vector<YAML::Node> documents = YAML::LoadAll(input);
+        if (documents.size() > 1)
+            fail(documents[1], "more than one document");
+        readScenario(documents.empty() ? YAML::Node() : documents[0], &parsed);
     } catch (const SBad& bad) {
         *line = bad.nLine;
         *reason = bad.strReason;
