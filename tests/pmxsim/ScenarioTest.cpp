@@ -2,6 +2,8 @@
 // malformed one leaves no sensor and one line on stderr, and that a reload replaces the scenario.
 #include "tests/pmxsim/PmxSimFixture.h"
 
+#include <gmock/gmock.h>
+
 #include <cstdio>
 #include <cstdlib>
 #include <fstream>
@@ -180,6 +182,27 @@ TEST_F(ScenarioTest, UnreadableOrEndlessFileLeavesNoSensor)
                   loadFrom(path));
         EXPECT_EQ(0, sensors());
     }
+}
+
+// The first call into the library reads the file; when that call is PmxSimReset, the file is
+// read once, not once for the new simulator and again for the reset. Only a fresh process shows
+// it: the statement runs in a new run of this program.
+TEST(ScenarioFirstCall, ResetAsFirstCallComplainsOnce)
+{
+    GTEST_FLAG_SET(death_test_style, "threadsafe");
+    std::string path = testing::TempDir() + "pmxsim_first_call.yaml";
+    std::ofstream(path, std::ios::binary) << "sensors: [";
+    auto once = [](const std::string& err) {
+        size_t first = err.find("no sensors attached\n");
+        return first != std::string::npos && err.find("no sensors attached", first + 1) == std::string::npos;
+    };
+    EXPECT_EXIT(
+        {
+            setConfig(path.c_str());
+            std::exit(PmxSimReset());
+        },
+        testing::ExitedWithCode(0), testing::Truly(once));
+    std::remove(path.c_str());
 }
 
 #else
