@@ -6,6 +6,7 @@
 
 #include <cerrno>
 #include <cmath>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <initializer_list>
@@ -57,23 +58,35 @@ std::string text(const YAML::Node& node, const std::string& what)
     return node.Scalar();
 }
 
+// A bound in a complaint, in its shortest form ("0", "100", "1e-06").
+std::string bound(double value)
+{
+    char buffer[32];
+    std::snprintf(buffer, sizeof buffer, "%g", value);
+    return buffer;
+}
+
 double real(const YAML::Node& node, const std::string& what, double low, double high)
 {
-    std::string value = text(node, what);
+    if (!node.IsScalar())
+        fail(node, what + " must be a number");
+    std::string value = node.Scalar();
     char* rest = nullptr;
     errno = 0;
     double parsed = std::strtod(value.c_str(), &rest);
     if (value.empty() || *rest != '\0' || errno != 0 || !std::isfinite(parsed))
         fail(node, what + " must be a number");
     if (parsed < low || parsed > high)
-        fail(node, what + " must be within " + std::to_string(low) + " and " + std::to_string(high));
+        fail(node, what + " must be within " + bound(low) + " and " + bound(high));
     return parsed;
 }
 
 // A whole number, decimal or hexadecimal (0x...), within [low, high].
 int64_t whole(const YAML::Node& node, const std::string& what, int64_t low, int64_t high)
 {
-    std::string value = text(node, what);
+    if (!node.IsScalar())
+        fail(node, what + " must be a whole number");
+    std::string value = node.Scalar();
     bool hex = value.size() > 2 && value[0] == '0' && (value[1] == 'x' || value[1] == 'X');
     char* rest = nullptr;
     errno = 0;
