@@ -117,7 +117,11 @@ PMX_API int32_t PmxSetNotifyCallbackStateChanged(PmxNotifyCallback callback, voi
 
 PMX_API int32_t PmxSimReset(void)
 {
-    return sim().reset();
+    // A simulator made by this very call is as freshly loaded already: loading again would read
+    // the scenario file twice and repeat its complaints.
+    bool made = false;
+    CSimulator& simulator = CSimulator::instance(&made);
+    return made ? PMX_SUCCESS : simulator.reset();
 }
 PMX_API int32_t PmxSimAttach(const char* type, const char* serial)
 {

@@ -5,8 +5,6 @@
 
 #include <cstdio>
 #include <cstdlib>
-#include <fstream>
-#include <sstream>
 
 namespace PmxSim {
 
@@ -21,15 +19,25 @@ void complain(const std::string& text)
     std::fflush(stderr);
 }
 
+// Reads at most one byte beyond the limit, so an endless source (/dev/zero) ends the read too.
 bool readFile(const std::string& path, std::string* text)
 {
-    std::ifstream file(path, std::ios::binary);
-    if (!file)
+    std::FILE* file = std::fopen(path.c_str(), "rb");
+    if (file == nullptr)
         return false;
-    std::ostringstream content;
-    content << file.rdbuf();
-    *text = content.str();
-    return !file.bad() && text->size() <= MAX_SCENARIO_BYTES;
+    text->resize(MAX_SCENARIO_BYTES + 1);
+    size_t size = 0;
+    while (size < text->size()) {
+        size_t got = std::fread(&(*text)[size], 1, text->size() - size, file);
+        if (got == 0)
+            break;
+        size += got;
+    }
+    // A directory opens on POSIX systems, but reading it fails (EISDIR): ferror tells.
+    bool failed = std::ferror(file) != 0;
+    std::fclose(file);
+    text->resize(size);
+    return !failed && size <= MAX_SCENARIO_BYTES;
 }
 
 SScenario fileScenario(const std::string& path)

@@ -1,4 +1,4 @@
-// Contract: a scenario is everything the simulated library is configured with when it loads or is
+// Contract: a scenario is everything the simulated library is configured with at its first call or
 // reset: the attached sensors with their models (measured power, trace, extra answers, a detach
 // after some measurements), the delays and scripted failures of library functions. It comes from
 // the file named by PMXSIM_CONFIG, else from PMXSIM_DEVICES, else the two default sensors.

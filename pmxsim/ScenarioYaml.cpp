@@ -6,10 +6,12 @@
 
 #include <cerrno>
 #include <cmath>
+#include <cstdio>
 #include <cstdlib>
 #include <cstring>
 #include <initializer_list>
 #include <set>
+#include <vector>
 
 namespace PmxSim {
 
@@ -30,11 +32,13 @@ struct SBad {
     throw SBad{node.Mark().is_null() ? 0 : node.Mark().line + 1, reason};
 }
 
-// The keys of a mapping must come from the allowed set.
+// The keys of a mapping must come from the allowed set, each at most once (the parser keeps a
+// repeated key, and a lookup would silently find its first value).
 void expectMap(const YAML::Node& node, const std::string& what, std::initializer_list<const char*> allowed)
 {
     if (!node.IsMap())
         fail(node, what + " must be a mapping");
+    std::set<std::string> seen;
     for (const auto& item : node) {
         std::string key = item.first.IsScalar() ? item.first.Scalar() : std::string();
         bool known = false;
@@ -42,6 +46,8 @@ void expectMap(const YAML::Node& node, const std::string& what, std::initializer
             known = known || key == name;
         if (!known)
             fail(item.first, "unknown key \"" + key + "\" in " + what);
+        if (!seen.insert(key).second)
+            fail(item.first, "repeated key \"" + key + "\" in " + what);
     }
 }
 
@@ -52,23 +58,35 @@ std::string text(const YAML::Node& node, const std::string& what)
     return node.Scalar();
 }
 
+// A bound in a complaint, in its shortest form ("0", "100", "1e-06").
+std::string bound(double value)
+{
+    char buffer[32];
+    std::snprintf(buffer, sizeof buffer, "%g", value);
+    return buffer;
+}
+
 double real(const YAML::Node& node, const std::string& what, double low, double high)
 {
-    std::string value = text(node, what);
+    if (!node.IsScalar())
+        fail(node, what + " must be a number");
+    std::string value = node.Scalar();
     char* rest = nullptr;
     errno = 0;
     double parsed = std::strtod(value.c_str(), &rest);
     if (value.empty() || *rest != '\0' || errno != 0 || !std::isfinite(parsed))
         fail(node, what + " must be a number");
     if (parsed < low || parsed > high)
-        fail(node, what + " must be within " + std::to_string(low) + " and " + std::to_string(high));
+        fail(node, what + " must be within " + bound(low) + " and " + bound(high));
     return parsed;
 }
 
 // A whole number, decimal or hexadecimal (0x...), within [low, high].
 int64_t whole(const YAML::Node& node, const std::string& what, int64_t low, int64_t high)
 {
-    std::string value = text(node, what);
+    if (!node.IsScalar())
+        fail(node, what + " must be a whole number");
+    std::string value = node.Scalar();
     bool hex = value.size() > 2 && value[0] == '0' && (value[1] == 'x' || value[1] == 'X');
     char* rest = nullptr;
     errno = 0;
@@ -252,7 +270,10 @@ bool parseScenario(const std::string& input, SScenario* scenario, int* line, std
 {
     SScenario parsed;
     try {
-        readScenario(YAML::Load(input), &parsed);
+        std::vector<YAML::Node> documents = YAML::LoadAll(input);
+        if (documents.size() > 1)
+            fail(documents[1], "more than one document");
+        readScenario(documents.empty() ? YAML::Node() : documents[0], &parsed);
     } catch (const SBad& bad) {
         *line = bad.nLine;
         *reason = bad.strReason;

@@ -76,7 +76,8 @@ enum ECallback {
 
 class CSimulator {
 public:
-    static CSimulator& instance();
+    // made: set when this call made the instance (which then has just loaded the defaults).
+    static CSimulator& instance(bool* made = nullptr);
     static void shutdownAtUnload();
 
     int32_t openDriver();

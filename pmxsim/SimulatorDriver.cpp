@@ -19,13 +19,15 @@ thread_local bool t_bInCallback = false;
 std::atomic<CSimulator*> g_pInstance(nullptr);
 } // namespace
 
-CSimulator& CSimulator::instance()
+CSimulator& CSimulator::instance(bool* made)
 {
-    // Deliberately never destroyed (see the header).
-    static CSimulator* simulator = [] {
-        CSimulator* made = new CSimulator();
-        g_pInstance.store(made);
-        return made;
+    // Deliberately never destroyed (see the header). Only the first caller runs the lambda.
+    static CSimulator* simulator = [made] {
+        CSimulator* built = new CSimulator();
+        g_pInstance.store(built);
+        if (made != nullptr)
+            *made = true;
+        return built;
     }();
     return *simulator;
 }

@@ -2,6 +2,8 @@
 // malformed one leaves no sensor and one line on stderr, and that a reload replaces the scenario.
 #include "tests/pmxsim/PmxSimFixture.h"
 
+#include <gmock/gmock.h>
+
 #include <cstdio>
 #include <cstdlib>
 #include <fstream>
@@ -34,11 +36,16 @@ protected:
     {
         std::string path = testing::TempDir() + "pmxsim_scenario.yaml";
         std::ofstream(path, std::ios::binary) << text;
+        std::string complaint = loadFrom(path);
+        std::remove(path.c_str());
+        return complaint;
+    }
+    std::string loadFrom(const std::string& path)
+    {
         setConfig(path.c_str());
         testing::internal::CaptureStderr();
         EXPECT_EQ(0, PmxSimReset());
         std::string complaint = testing::internal::GetCapturedStderr();
-        std::remove(path.c_str());
         EXPECT_EQ(0, PmxSimSetDelays(0, 0));
         registerAll(&m_aRecorder);
         EXPECT_EQ(0, PmxOpenDriver());
@@ -132,9 +139,12 @@ TEST_F(ScenarioTest, MalformedFileLeavesNoSensorAndNamesLineAndReason)
         {"sensors:\n  - {type: PMX, serial: 1, power: loud}", ":2: power must be a number"},
         {"sensors:\n  - {type: PMX, serial: 1, power: []}", ":2: the power sequence must hold"},
         {"sensors:\n  - {type: PMX, serial: 1, power: {noise: 1}}", ":2: power needs a level"},
-        {"sensors:\n  - {type: PMX, serial: 1, power: {level: -1, noise: -1}}", ":2: the power noise must be within"},
+        {"sensors:\n  - {type: PMX, serial: 1, power: [-20, [1]]}", ":2: a power level must be a number;"},
+        {"sensors:\n  - {type: PMX, serial: 1, power: {level: -1, noise: -1}}",
+         ":2: the power noise must be within 0 and 100;"},
         {"sensors:\n  - type: PMX\n    serial: 1\n    trace: {pulse: {duration: 0}}",
-         ":4: the pulse duration must be within"},
+         ":4: the pulse duration must be within 1e-06 and 1e+09;"},
+        {"delays: {measurement: [1]}", ":1: the measurement time must be a whole number;"},
         {"sensors:\n  - type: PMX\n    serial: 1\n    answers: [{pattern: x}]",
          ":4: an answer needs a pattern and either"},
         {"sensors:\n  - {type: PMX, serial: 1, detach_after: 0}", ":2: detach_after must be within 1"},
@@ -142,6 +152,10 @@ TEST_F(ScenarioTest, MalformedFileLeavesNoSensorAndNamesLineAndReason)
         {"faults:\n  - {function: PmxFly, code: 1}", ":2: unknown library function \"PmxFly\""},
         {"faults:\n  - {function: PmxGetData, code: 0}", ":2: the fault code must not be 0"},
         {"- just a list", ":1: the scenario must be a mapping"},
+        {"sensors: []\ndelays: {}\nsensors:\n  - {type: PMX, serial: 1}", ":3: repeated key \"sensors\" in the scenario"},
+        {"sensors:\n  - type: PMX\n    serial: 1\n    serial: 2", ":4: repeated key \"serial\" in a sensor"},
+        {"delays: {acknowledge: 5, acknowledge: 6}", ":1: repeated key \"acknowledge\" in delays"},
+        {"sensors:\n  - {type: PMX, serial: 1}\n---\nsensors: []", ":4: more than one document"},
     };
     for (const auto& bad : BAD_SCENARIOS) {
         SCOPED_TRACE(bad[0]);
@@ -159,6 +173,39 @@ TEST_F(ScenarioTest, MalformedFileLeavesNoSensorAndNamesLineAndReason)
     ASSERT_FALSE(text.empty());
     EXPECT_EQ("", load(text));
     EXPECT_EQ(3, sensors());
+}
+
+TEST_F(ScenarioTest, UnreadableOrEndlessFileLeavesNoSensor)
+{
+    // /dev/zero never ends: only the first bytes beyond the limit are read. A directory opens
+    // but cannot be read.
+    for (std::string path : {std::string("/dev/zero"), testing::TempDir()}) {
+        SCOPED_TRACE(path);
+        EXPECT_EQ("pmxsim: " + path + ": cannot be read (or is larger than 1 MiB); no sensors attached\n",
+                  loadFrom(path));
+        EXPECT_EQ(0, sensors());
+    }
+}
+
+// The first call into the library reads the file; when that call is PmxSimReset, the file is
+// read once, not once for the new simulator and again for the reset. Only a fresh process shows
+// it: the statement runs in a new run of this program.
+TEST(ScenarioFirstCall, ResetAsFirstCallComplainsOnce)
+{
+    GTEST_FLAG_SET(death_test_style, "threadsafe");
+    std::string path = testing::TempDir() + "pmxsim_first_call.yaml";
+    std::ofstream(path, std::ios::binary) << "sensors: [";
+    auto once = [](const std::string& err) {
+        size_t first = err.find("no sensors attached\n");
+        return first != std::string::npos && err.find("no sensors attached", first + 1) == std::string::npos;
+    };
+    EXPECT_EXIT(
+        {
+            setConfig(path.c_str());
+            std::exit(PmxSimReset());
+        },
+        testing::ExitedWithCode(0), testing::Truly(once));
+    std::remove(path.c_str());
 }
 
 #else
