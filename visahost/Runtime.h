@@ -122,6 +122,7 @@ private:
         EXCLUDES(g_aRuntimeMutex);
     static ViStatus parsedAttribute(const CSession& cSession, ViAttr nAttr, void* pValue);
     void closeEvent(ViEvent nContext) REQUIRES(g_aRuntimeMutex);
+    ViStatus enableEnabledEvents(ViSession nVi, ViUInt16 nMech, ViEventFilter nContext) EXCLUDES(g_aRuntimeMutex);
     void releaseRsrcLocks(const CSession& cSession) REQUIRES(g_aRuntimeMutex);
     // A new session on resource szName, opened through pcTable: parses the name with the
     // table's viParseRsrcEx, publishes the session and calls the table's viOpen. Null (with

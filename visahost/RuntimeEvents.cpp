@@ -176,6 +176,8 @@ void CRuntime::runHandlers()
 
 ViStatus CRuntime::enableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech, ViEventFilter nContext)
 {
+    if (nType == VI_ALL_ENABLED_EVENTS)
+        return enableEnabledEvents(nVi, nMech, nContext);
     bool bAsk = false;
     {
         LbCore::CMutexLock aGuard(g_aRuntimeMutex);
@@ -217,6 +219,38 @@ ViStatus CRuntime::enableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech,
     pc->m_mapEnabled[nType] = static_cast<ViUInt16>(nEnabled | nMech);
     pc->m_bQueueFixed = true;
     return (nEnabled & nMech) == nMech ? VI_SUCCESS_EVENT_EN : VI_SUCCESS;
+}
+
+// VI_ALL_ENABLED_EVENTS: every type the session has enabled is enabled for the mechanism too.
+// VI_SUCCESS_EVENT_EN when each already was (or none is enabled).
+ViStatus CRuntime::enableEnabledEvents(ViSession nVi, ViUInt16 nMech, ViEventFilter nContext)
+{
+    std::vector<ViEventType> vTypes;
+    {
+        LbCore::CMutexLock aGuard(g_aRuntimeMutex);
+        ViStatus nStatus = VI_SUCCESS;
+        PSession pc = eventSession(nVi, VI_ALL_ENABLED_EVENTS, true, nStatus);
+        if (!pc)
+            return nStatus;
+        if (!validMechanism(nMech, false))
+            return VI_ERROR_INV_MECH;
+        if (nMech & VI_SUSPEND_HNDLR)
+            return VI_ERROR_NSUP_MECH;
+        if (nContext != VI_NULL)
+            return VI_ERROR_INV_CONTEXT;
+        for (const auto& sEnabled : pc->m_mapEnabled)
+            if (sEnabled.second != 0)
+                vTypes.push_back(sEnabled.first);
+    }
+    ViStatus nResult = VI_SUCCESS_EVENT_EN;
+    for (ViEventType nType : vTypes) {
+        ViStatus nStatus = enableEvent(nVi, nType, nMech, nContext);
+        if (nStatus < VI_SUCCESS)
+            return nStatus;
+        if (nStatus == VI_SUCCESS)
+            nResult = VI_SUCCESS;
+    }
+    return nResult;
 }
 
 ViStatus CRuntime::disableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech)

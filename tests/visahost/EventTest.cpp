@@ -224,6 +224,23 @@ TEST_F(Events, AHandlerMayCloseItsOwnSession)
     EXPECT_EQ(VI_ERROR_INV_OBJECT, write(m_nVi, "EVENT 1"));
 }
 
+// VI_ALL_ENABLED_EVENTS adds the mechanism to every type that is enabled, and to no other.
+TEST_F(Events, EnablingAllEnabledEventsAddsTheMechanismToEach)
+{
+    EXPECT_EQ(VI_SUCCESS_EVENT_EN, viEnableEvent(m_nVi, VI_ALL_ENABLED_EVENTS, VI_QUEUE, VI_NULL));
+    ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
+    EXPECT_EQ(VI_ERROR_NENABLED, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
+    SCalls sCalls;
+    ASSERT_EQ(VI_SUCCESS, viInstallHandler(m_nVi, VI_EVENT_SERVICE_REQ, secondHandler, &sCalls));
+    ASSERT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_HNDLR, VI_NULL));
+    EXPECT_EQ(VI_SUCCESS, viEnableEvent(m_nVi, VI_ALL_ENABLED_EVENTS, VI_QUEUE, VI_NULL));
+    EXPECT_EQ(VI_SUCCESS_EVENT_EN, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
+    EXPECT_EQ(VI_ERROR_INV_MECH, viEnableEvent(m_nVi, VI_ALL_ENABLED_EVENTS, 0x40, VI_NULL));
+    ASSERT_EQ(VI_SUCCESS, write(m_nVi, "EVENT 1"));
+    EXPECT_EQ(VI_SUCCESS, viWaitOnEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL, VI_NULL));
+    EXPECT_EQ(std::vector<int>({2}), sCalls.order(1)); // the handler too
+}
+
 TEST_F(Events, RepeatedEnableAndDisableAreAnsweredByTheRuntime)
 {
     // The test passport refuses a second enable and a disable of what is not enabled: the
@@ -286,7 +303,6 @@ TEST_F(Events, ClosingEndsAReadThatWaitsWithoutLimit)
 TEST_F(Events, WrongTypesAndMechanisms)
 {
     EXPECT_EQ(VI_ERROR_INV_EVENT, viEnableEvent(m_nVi, VI_EVENT_TRIG, VI_QUEUE, VI_NULL));
-    EXPECT_EQ(VI_ERROR_INV_EVENT, viEnableEvent(m_nVi, VI_ALL_ENABLED_EVENTS, VI_QUEUE, VI_NULL));
     EXPECT_EQ(VI_ERROR_INV_EVENT, viEnableEvent(m_nRm, VI_EVENT_SERVICE_REQ, VI_QUEUE, VI_NULL));
     EXPECT_EQ(VI_ERROR_INV_MECH, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, 0, VI_NULL));
     EXPECT_EQ(VI_ERROR_INV_MECH, viEnableEvent(m_nVi, VI_EVENT_SERVICE_REQ, 8, VI_NULL));
