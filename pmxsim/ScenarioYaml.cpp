@@ -2,6 +2,7 @@
 // reported with its line. Nothing is kept from a malformed file.
 #include "pmxsim/Scenario.h"
 
+#include <yaml-cpp/eventhandler.h>
 #include <yaml-cpp/yaml.h>
 
 #include <cerrno>
@@ -11,6 +12,7 @@
 #include <cstring>
 #include <initializer_list>
 #include <set>
+#include <sstream>
 #include <vector>
 
 namespace PmxSim {
@@ -27,9 +29,47 @@ struct SBad {
     std::string strReason;
 };
 
+[[noreturn]] void fail(const YAML::Mark& mark, const std::string& reason)
+{
+    throw SBad{mark.is_null() ? 0 : mark.line + 1, reason};
+}
+
 [[noreturn]] void fail(const YAML::Node& node, const std::string& reason)
 {
-    throw SBad{node.Mark().is_null() ? 0 : node.Mark().line + 1, reason};
+    fail(node.Mark(), reason);
+}
+
+// Notes where the second document of a text starts, building nothing. (YAML::LoadAll cannot
+// serve: on some malformed texts it never returns.)
+class CDocumentCounter : public YAML::EventHandler {
+public:
+    int m_nDocuments = 0;
+    YAML::Mark m_cSecond = YAML::Mark::null_mark();
+
+    void OnDocumentStart(const YAML::Mark& mark) override
+    {
+        if (++m_nDocuments == 2)
+            m_cSecond = mark;
+    }
+    void OnDocumentEnd() override { }
+    void OnNull(const YAML::Mark&, YAML::anchor_t) override { }
+    void OnAlias(const YAML::Mark&, YAML::anchor_t) override { }
+    void OnScalar(const YAML::Mark&, const std::string&, YAML::anchor_t, const std::string&) override { }
+    void OnSequenceStart(const YAML::Mark&, const std::string&, YAML::anchor_t, YAML::EmitterStyle::value) override { }
+    void OnSequenceEnd() override { }
+    void OnMapStart(const YAML::Mark&, const std::string&, YAML::anchor_t, YAML::EmitterStyle::value) override { }
+    void OnMapEnd() override { }
+};
+
+// A scenario is one document: a second one is refused, not ignored, at the line where it starts
+// (its "---").
+void expectOneDocument(const std::string& input)
+{
+    std::istringstream stream(input);
+    YAML::Parser parser(stream);
+    CDocumentCounter counter;
+    if (parser.HandleNextDocument(counter) && parser.HandleNextDocument(counter))
+        fail(counter.m_cSecond, "more than one document");
 }
 
 // The keys of a mapping must come from the allowed set, each at most once (the parser keeps a
@@ -270,10 +310,8 @@ bool parseScenario(const std::string& input, SScenario* scenario, int* line, std
 {
     SScenario parsed;
     try {
-        std::vector<YAML::Node> documents = YAML::LoadAll(input);
-        if (documents.size() > 1)
-            fail(documents[1], "more than one document");
-        readScenario(documents.empty() ? YAML::Node() : documents[0], &parsed);
+        expectOneDocument(input);
+        readScenario(YAML::Load(input), &parsed);
     } catch (const SBad& bad) {
         *line = bad.nLine;
         *reason = bad.strReason;

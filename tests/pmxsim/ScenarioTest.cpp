@@ -155,7 +155,7 @@ TEST_F(ScenarioTest, MalformedFileLeavesNoSensorAndNamesLineAndReason)
         {"sensors: []\ndelays: {}\nsensors:\n  - {type: PMX, serial: 1}", ":3: repeated key \"sensors\" in the scenario"},
         {"sensors:\n  - type: PMX\n    serial: 1\n    serial: 2", ":4: repeated key \"serial\" in a sensor"},
         {"delays: {acknowledge: 5, acknowledge: 6}", ":1: repeated key \"acknowledge\" in delays"},
-        {"sensors:\n  - {type: PMX, serial: 1}\n---\nsensors: []", ":4: more than one document"},
+        {"sensors:\n  - {type: PMX, serial: 1}\n---\nsensors: []", ":3: more than one document"},
     };
     for (const auto& bad : BAD_SCENARIOS) {
         SCOPED_TRACE(bad[0]);
