@@ -74,6 +74,7 @@ gateway_pid=$!
 wait_for "grep -q 'serving' '$work/gateway.log' 2>/dev/null" || fail "the gateway did not start"
 
 timeout 240 /usr/bin/python3 -I tests/lan_pyvisa.py "$base" "$work" || fail "pyvisa-py test"
+timeout 240 /usr/bin/python3 -I tests/tools/lan/lan_faults.py "$base" "$work" || fail "pyvisa-py fault cases"
 
 kill -TERM "$gateway_pid"
 rc=0

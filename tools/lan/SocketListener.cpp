@@ -52,10 +52,19 @@ void serveSocket(CGateway& gateway, unsigned index, CConnection& connection, CLa
                 continue;
             std::string command = line + "\n";
             unsigned long written = 0;
-            long status = link->write(command.data(), command.size(), SOCKET_IO_TIMEOUT_MS, 0, false, written);
+            bool answered = false;
+            // The write and the read of its answer hold the sensor's turn together, so that
+            // another client's query cannot take this answer or slip in between.
+            long status = link->beginTurn(SOCKET_IO_TIMEOUT_MS);
+            if (status == VXI11_OK) {
+                status = link->write(command.data(), command.size(), SOCKET_IO_TIMEOUT_MS, 0, false, written);
+                answered = status == VXI11_OK && isQuery(line) && readAnswer(*link, connection, answer);
+                link->endTurn();
+            }
             if (status != VXI11_OK) {
                 log.line("socket inst%u: \"%s\" failed (error %ld)", index, line.c_str(), status);
-            } else if (isQuery(line) && readAnswer(*link, connection, answer)) {
+            }
+            if (answered) {
                 answer += '\n';
                 if (!connection.writeAll(answer.data(), answer.size()))
                     return;
