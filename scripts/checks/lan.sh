@@ -73,6 +73,16 @@ LD_PRELOAD="$shim" LBPMX_LAN_SIMCTL="$work" "$gateway" --config "$work/lan.conf"
 gateway_pid=$!
 wait_for "grep -q 'serving' '$work/gateway.log' 2>/dev/null" || fail "the gateway did not start"
 
+# A second gateway refuses to start while this one serves, and leaves its registration alone.
+registration() { timeout 5 rpcinfo -p 127.0.0.1 2>/dev/null | grep ' 395183 '; }
+registered=$(registration)
+[ -n "$registered" ] || fail "not registered with rpcbind"
+timeout 60 "$gateway" --socket-port "$((base + 2))" --log "$work/second.log"
+rc=$?
+[ "$rc" -eq 1 ] && grep -q "another VXI-11 server is registered with rpcbind on port .* and running; not starting" \
+  "$work/second.log" || fail "a second gateway started beside a running one (exit $rc)"
+[ "$(registration)" = "$registered" ] || fail "a second gateway changed the registration: $(registration)"
+
 timeout 240 /usr/bin/python3 -I tests/lan_pyvisa.py "$base" "$work" || fail "pyvisa-py test"
 timeout 240 /usr/bin/python3 -I tests/tools/lan/lan_faults.py "$base" "$work" || fail "pyvisa-py fault cases"
 
