@@ -64,9 +64,11 @@ public:
     ~CLink(); // releases the lock, disables events and closes the VISA session
     long write(const char* data, std::size_t size, unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock,
                unsigned long& written);
-    // Reads up to `max` bytes; `termChar` >= 0 ends the answer after that byte (the rest is kept
-    // for the next read). reason: VXI-11 END / CHR / REQCNT bits. `gone` is asked between slices
-    // of a long wait, so a vanished client frees its link early.
+    // Reads up to `max` bytes of the answer; `termChar` >= 0 ends the piece after that byte.
+    // The whole answer is read from the sensor into the link and handed out in pieces: reason
+    // REQCNT while more remains, END with the last piece, CHR at the termination character.
+    // What remains is dropped by the link's next write or clear. `gone` is asked between
+    // slices of a long wait, so a vanished client frees its link early.
     long read(std::size_t max, unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock, int termChar,
               const std::function<bool()>& gone, std::string& data, long& reason);
     long readStb(unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock, unsigned char& stb);
@@ -92,6 +94,9 @@ private:
     ViStatus setTimeout(unsigned long ms);
     bool waitTurn(std::unique_lock<std::mutex>& guard, Clock::time_point deadline);
     void giveTurn(std::unique_lock<std::mutex>& guard);
+    ViStatus fetchAnswer(unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock,
+                         const std::function<bool()>& gone);
+    void dropAnswer();
 
     CGateway& m_cGateway;
     CSensor& m_cSensor;
@@ -100,7 +105,9 @@ private:
     std::uintptr_t m_nSrqId = 0; // the handler's number while service requests are enabled
     unsigned long m_nTimeout = 0;
     bool m_bHoldsTurn = false;  // between beginTurn and endTurn
-    std::string m_strPending; // read data beyond a termination character
+    std::string m_strAnswer;    // the answer being handed out, from m_nAnswerAt on
+    std::size_t m_nAnswerAt = 0;
+    std::size_t m_nCapacity;    // buffer size the next answer is read with
     std::function<void()> m_fSrq;
 };
 

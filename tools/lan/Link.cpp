@@ -14,6 +14,13 @@ namespace {
 constexpr unsigned long READ_SLICE_MS = 1000;
 // VI_TMO_INFINITE and other huge client timeouts are bounded by a day.
 constexpr unsigned long LONGEST_WAIT_MS = 24ul * 3600 * 1000;
+// A sensor hands out an answer whole or not at all, so a link reads it into a buffer of its own
+// that starts at this size and grows (up to the largest answer) while the answer does not fit.
+constexpr std::size_t FIRST_ANSWER_BUFFER = 65536;
+constexpr std::size_t LARGEST_ANSWER = 16 * 1048576;
+constexpr long REASON_REQCNT = 0x01;
+constexpr long REASON_CHR = 0x02;
+constexpr long REASON_END = 0x04;
 
 Clock::time_point deadlineIn(unsigned long ms)
 {
@@ -35,7 +42,7 @@ std::uintptr_t s_nNextSrq = 1;
 } // namespace
 
 CLink::CLink(CGateway& gateway, CSensor& sensor, ViSession session)
-    : m_cGateway(gateway), m_cSensor(sensor), m_nSession(session)
+    : m_cGateway(gateway), m_cSensor(sensor), m_nSession(session), m_nCapacity(FIRST_ANSWER_BUFFER)
 {
 }
 
@@ -129,9 +136,16 @@ ViStatus CLink::exclusive(unsigned long ioTimeout, unsigned long lockTimeout, bo
     }
 }
 
+void CLink::dropAnswer()
+{
+    m_strAnswer.clear();
+    m_nAnswerAt = 0;
+}
+
 long CLink::write(const char* data, std::size_t size, unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock,
                   unsigned long& written)
 {
+    dropAnswer(); // a new message makes what is left of the last answer stale
     ViUInt32 count = 0;
     ViStatus status = exclusive(ioTimeout, lockTimeout, waitLock, [&] {
         ViStatus s = setTimeout(ioTimeout);
@@ -143,6 +157,32 @@ long CLink::write(const char* data, std::size_t size, unsigned long ioTimeout, u
     return vxi11ErrorOf(status);
 }
 
+ViStatus CLink::fetchAnswer(unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock,
+                            const std::function<bool()>& gone)
+{
+    Clock::time_point deadline = deadlineIn(ioTimeout);
+    return exclusive(ioTimeout, lockTimeout, waitLock, [&] {
+        for (;;) {
+            unsigned long left = remainingMs(deadline);
+            ViStatus s = setTimeout(std::min(left, READ_SLICE_MS));
+            ViUInt32 count = 0;
+            if (s >= VI_SUCCESS) {
+                m_strAnswer.resize(m_nCapacity);
+                s = viRead(m_nSession, reinterpret_cast<ViPBuf>(&m_strAnswer[0]), static_cast<ViUInt32>(m_nCapacity),
+                           &count);
+                m_strAnswer.resize(s >= VI_SUCCESS ? count : 0);
+            }
+            if (s == VI_ERROR_USER_BUF && m_nCapacity < LARGEST_ANSWER) {
+                m_nCapacity = std::min(m_nCapacity * 4, LARGEST_ANSWER); // the sensor keeps the answer
+                continue;
+            }
+            if (s != VI_ERROR_TMO || left <= READ_SLICE_MS || gone()) {
+                return s;
+            }
+        }
+    });
+}
+
 long CLink::read(std::size_t max, unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock, int termChar,
                  const std::function<bool()>& gone, std::string& data, long& reason)
 {
@@ -151,48 +191,29 @@ long CLink::read(std::size_t max, unsigned long ioTimeout, unsigned long lockTim
     if (max == 0) {
         return VXI11_PARAMETER;
     }
-    ViStatus status = VI_SUCCESS;
-    if (!m_strPending.empty()) {
-        data.swap(m_strPending);
-        reason = 0x04; // the rest of an answer already read to its end
-    } else {
-        Clock::time_point deadline = deadlineIn(ioTimeout);
-        data.resize(max);
-        ViUInt32 count = 0;
-        status = exclusive(ioTimeout, lockTimeout, waitLock, [&] {
-            for (;;) {
-                unsigned long left = remainingMs(deadline);
-                ViStatus s = setTimeout(std::min(left, READ_SLICE_MS));
-                if (s >= VI_SUCCESS) {
-                    s = viRead(m_nSession, reinterpret_cast<ViPBuf>(&data[0]), static_cast<ViUInt32>(max), &count);
-                }
-                if (s != VI_ERROR_TMO || left <= READ_SLICE_MS || gone()) {
-                    return s;
-                }
-            }
-        });
-        data.resize(status >= VI_SUCCESS ? count : 0);
-        reason = status == VI_SUCCESS_MAX_CNT ? 0x01 : status == VI_SUCCESS_TERM_CHAR ? 0x02 : 0x04;
-    }
-    if (status < VI_SUCCESS) {
-        reason = 0;
-        return vxi11ErrorOf(status);
-    }
-    if (data.size() > max) { // pending data longer than this request
-        m_strPending = data.substr(max);
-        data.resize(max);
-        reason = 0x01;
-    }
-    if (termChar >= 0) {
-        std::size_t at = data.find(static_cast<char>(termChar));
-        if (at != std::string::npos) {
-            if (at + 1 < data.size()) {
-                m_strPending = data.substr(at + 1) + m_strPending;
-                data.resize(at + 1);
-                reason = 0;
-            }
-            reason |= 0x02;
+    if (m_nAnswerAt >= m_strAnswer.size()) {
+        dropAnswer();
+        ViStatus status = fetchAnswer(ioTimeout, lockTimeout, waitLock, gone);
+        if (status < VI_SUCCESS) {
+            dropAnswer();
+            return vxi11ErrorOf(status);
         }
+    }
+    std::size_t take = std::min(max, m_strAnswer.size() - m_nAnswerAt);
+    if (termChar >= 0) {
+        std::size_t at = m_strAnswer.find(static_cast<char>(termChar), m_nAnswerAt);
+        if (at != std::string::npos && at < m_nAnswerAt + take) {
+            take = at + 1 - m_nAnswerAt;
+            reason |= REASON_CHR;
+        }
+    }
+    data.assign(m_strAnswer, m_nAnswerAt, take);
+    m_nAnswerAt += take;
+    if (m_nAnswerAt == m_strAnswer.size()) {
+        reason |= REASON_END;
+        dropAnswer();
+    } else if (reason == 0) {
+        reason = REASON_REQCNT;
     }
     return VXI11_OK;
 }
@@ -218,7 +239,7 @@ long CLink::trigger(unsigned long ioTimeout, unsigned long lockTimeout, bool wai
 
 long CLink::clear(unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock)
 {
-    m_strPending.clear();
+    dropAnswer();
     return vxi11ErrorOf(exclusive(ioTimeout, lockTimeout, waitLock, [&] {
         ViStatus s = setTimeout(ioTimeout);
         return s < VI_SUCCESS ? s : viClear(m_nSession);

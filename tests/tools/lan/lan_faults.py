@@ -1,5 +1,5 @@
 """End-to-end cases of the LAN gateway beyond tests/lan_pyvisa.py: raw-socket queries of several
-clients at once. Run by scripts/checks/lan.sh against its running gateway (max-links 6, sensors 100000 and
+clients at once and answers read in pieces. Run by scripts/checks/lan.sh against its running gateway (max-links 6, sensors 100000 and
 100001), after lan_pyvisa.py.
 
 Usage: /usr/bin/python3 lan_faults.py <socket base port> <control folder>
@@ -10,8 +10,12 @@ import sys
 import threading
 
 import pyvisa
+from pyvisa_py.protocols import vxi11
 
 HOST = "127.0.0.1"
+REQCNT, CHR, END = 1, 2, 4
+TERMCHRSET = 0x80
+IO_TIMEOUT = 15
 IDN0 = b"Marlowe&Tenby,PMX-M01,100000,1.20"
 
 
@@ -50,11 +54,47 @@ def socket_queries_at_once(base):
     step("four socket clients querying one sensor at once each got their own answers")
 
 
+def answers_in_pieces(rm):
+    c = vxi11.CoreClient(HOST)
+    try:
+        error, link, _, _ = c.create_link(5, 0, 0, "inst0")
+        assert error == 0, error
+        assert c.device_write(link, 5000, 0, 8, b"*IDN?\n")[0] == 0
+        assert c.device_read(link, 8, 5000, 0, 0, 0) == (0, REQCNT, IDN0[:8])
+        assert c.device_read(link, 8, 5000, 0, TERMCHRSET, ord(",")) == (0, CHR, IDN0[8:14])
+        assert c.device_read(link, 1000, 5000, 0, 0, 0) == (0, END, IDN0[14:])
+        # What is left of an answer is dropped by the next write and by a clear.
+        assert c.device_write(link, 5000, 0, 8, b"*IDN?\n")[0] == 0
+        assert c.device_read(link, 4, 5000, 0, 0, 0)[:2] == (0, REQCNT)
+        assert c.device_write(link, 5000, 0, 8, b"*TST?\n")[0] == 0
+        assert c.device_read(link, 100, 5000, 0, 0, 0) == (0, END, b"0")
+        assert c.device_write(link, 5000, 0, 8, b"*IDN?\n")[0] == 0
+        assert c.device_read(link, 4, 5000, 0, 0, 0)[:2] == (0, REQCNT)
+        assert c.device_clear(link, 0, 0, 5000) == 0
+        assert c.device_read(link, 100, 300, 0, 0, 0)[0] == IO_TIMEOUT
+        c.destroy_link(link)
+    finally:
+        c.close()
+    inst = rm.open_resource("TCPIP::%s::inst0::INSTR" % HOST)
+    inst.timeout = 5000
+    inst.write_termination = "\n"
+    inst.chunk_size = 1024
+    for command in ("FUNC TRACE", "TRAC:POIN 1024", "format real,32", "INIT"):
+        inst.write(command)
+    trace = inst.query_binary_values("FETC?", datatype="f", is_big_endian=False)
+    assert len(trace) == 1024, len(trace)
+    inst.write("format ascii")
+    inst.write("FUNC POWER")
+    inst.close()
+    step("answers larger than the request are read in pieces (REQCNT, CHR, END)")
+
+
 def main(base, control):
     signal.alarm(200)  # a hang fails the test instead of stalling the test command
     rm = pyvisa.ResourceManager("@py")
     try:
         socket_queries_at_once(base)
+        answers_in_pieces(rm)
     finally:
         rm.close()
 
