@@ -85,6 +85,8 @@ rc=$?
 
 timeout 240 /usr/bin/python3 -I tests/lan_pyvisa.py "$base" "$work" || fail "pyvisa-py test"
 timeout 240 /usr/bin/python3 -I tests/tools/lan/lan_faults.py "$base" "$work" || fail "pyvisa-py fault cases"
+grep -q "socket inst1: 127.0.0.1 closed, the sensor's session is gone" "$work/gateway.log" \
+  || fail "no log line for the closed socket of a replugged sensor"
 
 kill -TERM "$gateway_pid"
 rc=0

@@ -79,6 +79,9 @@ public:
     // operations until endTurn, so that a write and the read of its answer run as one unit.
     long beginTurn(unsigned long ioTimeout);
     void endTurn();
+    // After a failed operation: true when the session failed because its sensor is gone (an
+    // unplugged sensor's sessions stay dead even when it returns).
+    bool sensorGone();
     long unlock();
     // Calls `srq` (on the VISA runtime's handler thread) whenever the sensor requests service.
     long enableSrq(bool enable, std::function<void()> srq);
@@ -105,6 +108,7 @@ private:
     std::uintptr_t m_nSrqId = 0; // the handler's number while service requests are enabled
     unsigned long m_nTimeout = 0;
     bool m_bHoldsTurn = false;  // between beginTurn and endTurn
+    bool m_bFailed = false;     // the last write or read failed other than by a time-out
     std::string m_strAnswer;    // the answer being handed out, from m_nAnswerAt on
     std::size_t m_nAnswerAt = 0;
     std::size_t m_nCapacity;    // buffer size the next answer is read with

@@ -18,6 +18,8 @@ constexpr unsigned long LONGEST_WAIT_MS = 24ul * 3600 * 1000;
 // that starts at this size and grows (up to the largest answer) while the answer does not fit.
 constexpr std::size_t FIRST_ANSWER_BUFFER = 65536;
 constexpr std::size_t LARGEST_ANSWER = 16 * 1048576;
+// How long the check whether a failed session's sensor is gone waits for the sensor's turn.
+constexpr unsigned long PROBE_TIMEOUT_MS = 2000;
 constexpr long REASON_REQCNT = 0x01;
 constexpr long REASON_CHR = 0x02;
 constexpr long REASON_END = 0x04;
@@ -153,6 +155,7 @@ long CLink::write(const char* data, std::size_t size, unsigned long ioTimeout, u
             ? s
             : viWrite(m_nSession, reinterpret_cast<ViConstBuf>(data), static_cast<ViUInt32>(size), &count);
     });
+    m_bFailed = status < VI_SUCCESS;
     written = count;
     return vxi11ErrorOf(status);
 }
@@ -194,6 +197,7 @@ long CLink::read(std::size_t max, unsigned long ioTimeout, unsigned long lockTim
     if (m_nAnswerAt >= m_strAnswer.size()) {
         dropAnswer();
         ViStatus status = fetchAnswer(ioTimeout, lockTimeout, waitLock, gone);
+        m_bFailed = status < VI_SUCCESS && status != VI_ERROR_TMO;
         if (status < VI_SUCCESS) {
             dropAnswer();
             return vxi11ErrorOf(status);
@@ -216,6 +220,21 @@ long CLink::read(std::size_t max, unsigned long ioTimeout, unsigned long lockTim
         reason = REASON_REQCNT;
     }
     return VXI11_OK;
+}
+
+bool CLink::sensorGone()
+{
+    if (!m_bFailed)
+        return false;
+    // A session whose sensor was unplugged fails every call for good, even after the sensor
+    // returns; a living one answers its status byte unless another link holds it.
+    ViUInt16 stb = 0;
+    ViStatus status = exclusive(PROBE_TIMEOUT_MS, 0, false, [&] {
+        ViStatus s = setTimeout(PROBE_TIMEOUT_MS);
+        return s < VI_SUCCESS ? s : viReadSTB(m_nSession, &stb);
+    });
+    return status < VI_SUCCESS && status != VI_ERROR_TMO && status != VI_ERROR_RSRC_LOCKED &&
+        status != VI_ERROR_RSRC_BUSY;
 }
 
 long CLink::readStb(unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock, unsigned char& stb)

@@ -64,7 +64,14 @@ void serveSocket(CGateway& gateway, unsigned index, CConnection& connection, CLa
             if (status != VXI11_OK) {
                 log.line("socket inst%u: \"%s\" failed (error %ld)", index, line.c_str(), status);
             }
-            if (answered) {
+            if (status != VXI11_OK || (isQuery(line) && !answered)) {
+                if (link->sensorGone()) {
+                    // Closing tells the client; a new connection gets a session on the sensor.
+                    log.line("socket inst%u: %s closed, the sensor's session is gone", index,
+                             connection.peerText().c_str());
+                    return;
+                }
+            } else if (answered) {
                 answer += '\n';
                 if (!connection.writeAll(answer.data(), answer.size()))
                     return;

@@ -1,5 +1,6 @@
 """End-to-end cases of the LAN gateway beyond tests/lan_pyvisa.py: raw-socket queries of several
-clients at once and answers read in pieces. Run by scripts/checks/lan.sh against its running gateway (max-links 6, sensors 100000 and
+clients at once, answers read in pieces, and a raw socket whose sensor was unplugged and plugged
+back. Run by scripts/checks/lan.sh against its running gateway (max-links 6, sensors 100000 and
 100001), after lan_pyvisa.py.
 
 Usage: /usr/bin/python3 lan_faults.py <socket base port> <control folder>
@@ -21,6 +22,13 @@ IDN0 = b"Marlowe&Tenby,PMX-M01,100000,1.20"
 
 def step(text):
     print("  " + text, flush=True)
+
+
+def sim(control, command):
+    with open(control + "/ctl", "w") as ctl:
+        ctl.write(command + "\n")
+    with open(control + "/ack") as ack:
+        assert ack.readline().strip() == "0", command
 
 
 def socket_queries_at_once(base):
@@ -89,12 +97,33 @@ def answers_in_pieces(rm):
     step("answers larger than the request are read in pieces (REQCNT, CHR, END)")
 
 
+def replugged_socket(base, control):
+    old = socket.create_connection((HOST, base + 1), 10)
+    old.settimeout(10)
+    old.sendall(b"*IDN?\n")
+    assert old.recv(100).startswith(b"Marlowe&Tenby,PMX-M10,100001")
+    sim(control, "detach 100001")
+    sim(control, "attach PMX-M10 100001")
+    old.sendall(b"*IDN?\n")
+    try:
+        assert old.recv(100) == b"", "a dead session's connection stayed open"
+    except ConnectionResetError:
+        pass
+    old.close()
+    with socket.create_connection((HOST, base + 1), 10) as again:
+        again.settimeout(10)
+        again.sendall(b"*IDN?\n")
+        assert again.recv(100).startswith(b"Marlowe&Tenby,PMX-M10,100001")
+    step("a socket whose sensor was replugged is closed; a new one works")
+
+
 def main(base, control):
     signal.alarm(200)  # a hang fails the test instead of stalling the test command
     rm = pyvisa.ResourceManager("@py")
     try:
         socket_queries_at_once(base)
         answers_in_pieces(rm)
+        replugged_socket(base, control)
     finally:
         rm.close()
 
