@@ -23,7 +23,6 @@ std::string lower(std::string s)
 
 } // namespace
 
-
 long vxi11ErrorOf(ViStatus status)
 {
     if (status >= VI_SUCCESS)

@@ -107,11 +107,11 @@ private:
     bool m_bLocked = false;
     std::uintptr_t m_nSrqId = 0; // the handler's number while service requests are enabled
     unsigned long m_nTimeout = 0;
-    bool m_bHoldsTurn = false;  // between beginTurn and endTurn
-    bool m_bFailed = false;     // the last write or read failed other than by a time-out
-    std::string m_strAnswer;    // the answer being handed out, from m_nAnswerAt on
+    bool m_bHoldsTurn = false; // between beginTurn and endTurn
+    bool m_bFailed = false;    // the last write or read failed other than by a time-out
+    std::string m_strAnswer;   // the answer being handed out, from m_nAnswerAt on
     std::size_t m_nAnswerAt = 0;
-    std::size_t m_nCapacity;    // buffer size the next answer is read with
+    std::size_t m_nCapacity; // buffer size the next answer is read with
     std::function<void()> m_fSrq;
 };
 

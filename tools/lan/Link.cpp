@@ -131,8 +131,7 @@ ViStatus CLink::exclusive(unsigned long ioTimeout, unsigned long lockTimeout, bo
         }
         // Another link holds the lock: wait for any release, then try again.
         ++releases;
-        if (!m_cGateway.m_cChanged.wait_until(guard, lockDeadline,
-                                              [&] { return m_cGateway.m_nReleases > releases; })) {
+        if (!m_cGateway.m_cChanged.wait_until(guard, lockDeadline, [&] { return m_cGateway.m_nReleases > releases; })) {
             return status;
         }
     }
