@@ -1,5 +1,7 @@
 #include "tools/lan/SocketListener.h"
 
+#include <cstring>
+
 #include "tools/lan/Config.h"
 #include "tools/lan/Gateway.h"
 #include "tools/lan/LineReader.h"
@@ -35,8 +37,9 @@ void serveSocket(CGateway& gateway, unsigned index, CConnection& connection, CLa
     long error = VXI11_OK;
     std::unique_ptr<CLink> link = gateway.open("inst" + std::to_string(index), error);
     if (!link) {
-        static const char text[] = "ERROR: sensor not available\n";
-        connection.writeAll(text, sizeof text - 1);
+        const char* text =
+            error == VXI11_OUT_OF_RESOURCES ? "ERROR: link limit reached\n" : "ERROR: sensor not available\n";
+        connection.writeAll(text, std::strlen(text));
         log.line("socket inst%u: %s refused (error %ld)", index, connection.peerText().c_str(), error);
         return;
     }

@@ -117,11 +117,32 @@ def replugged_socket(base, control):
     step("a socket whose sensor was replugged is closed; a new one works")
 
 
+def socket_link_limit(base):
+    clients = []
+    try:
+        for _ in range(7):  # max-links 6 (links closed just before may still count for a moment)
+            s = socket.create_connection((HOST, base), 10)
+            s.settimeout(10)
+            clients.append(s)
+            s.sendall(b"*OPC?\n")
+            answer = s.recv(100)
+            if answer != b"1\n":
+                assert answer == b"ERROR: link limit reached\n", answer
+                break
+        else:
+            raise AssertionError("a seventh socket on one sensor was served")
+    finally:
+        for s in clients:
+            s.close()
+    step("a socket beyond the link limit is told so")
+
+
 def main(base, control):
     signal.alarm(200)  # a hang fails the test instead of stalling the test command
     rm = pyvisa.ResourceManager("@py")
     try:
         socket_queries_at_once(base)
+        socket_link_limit(base)
         answers_in_pieces(rm)
         replugged_socket(base, control)
     finally:
