@@ -87,6 +87,9 @@ timeout 240 /usr/bin/python3 -I tests/lan_pyvisa.py "$base" "$work" || fail "pyv
 timeout 240 /usr/bin/python3 -I tests/tools/lan/lan_faults.py "$base" "$work" || fail "pyvisa-py fault cases"
 grep -q "socket inst1: 127.0.0.1 closed, the sensor's session is gone" "$work/gateway.log" \
   || fail "no log line for the closed socket of a replugged sensor"
+grep -q "link [0-9]*: 127.0.0.1 closed inst0$" "$work/gateway.log" \
+  && grep -q "link [0-9]*: 127.0.0.1 closed inst0, its connection ended$" "$work/gateway.log" \
+  || fail "no log lines for closed VXI-11 links"
 
 kill -TERM "$gateway_pid"
 rc=0

@@ -42,8 +42,11 @@ public:
         : m_cGateway(gateway), m_cConnection(connection), m_nAbortPort(abortPort)
     {
     }
+    // The connection ended (closed, vanished or idle): its links go with it.
     ~CCoreConnection() override
     {
+        for (auto& link : m_mapLinks)
+            logClosed(link.first, *link.second, ", its connection ended");
         std::lock_guard<std::mutex> guard(s_cLinksMutex);
         for (auto& link : m_mapLinks)
             s_setLinks.erase(link.first);
@@ -147,6 +150,7 @@ public:
         auto it = m_mapLinks.find(lid);
         if (it == m_mapLinks.end())
             return VXI11_INVALID_LINK;
+        logClosed(lid, *it->second, "");
         m_mapLinks.erase(it);
         std::lock_guard<std::mutex> guard(s_cLinksMutex);
         s_setLinks.erase(lid);
@@ -174,6 +178,11 @@ public:
     long abort(Device_Link) override { return VXI11_NOT_SUPPORTED; }
 
 private:
+    void logClosed(long lid, const CLink& link, const char* why)
+    {
+        m_cGateway.log().line("link %ld: %s closed inst%u%s", lid, m_cConnection.peerText().c_str(),
+                              link.sensor().m_nIndex, why);
+    }
     CLink* find(long lid)
     {
         auto it = m_mapLinks.find(lid);
