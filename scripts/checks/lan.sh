@@ -2,7 +2,8 @@
 # End-to-end check of the LAN gateway with a VISA client that knows nothing of the passport:
 # starts rpcbind (when none runs; only the one started here is stopped again), starts
 # lbpmx-lan of the native build against the built runtime, passport and simulated sensors
-# (the two default sensors), runs tests/lan_pyvisa.py with Debian's pyvisa-py, then stops the
+# (the two default sensors), checks that a second gateway refuses to start beside it, runs
+# tests/lan_pyvisa.py and tests/tools/lan/lan_faults.py with Debian's pyvisa-py, then stops the
 # gateway with SIGTERM and expects a clean exit that also leaves rpcbind. Every wait is bounded.
 # LB_DEV_BUILD_DIR chooses another build folder.
 set -uo pipefail
