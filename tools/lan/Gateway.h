@@ -111,7 +111,7 @@ private:
     bool m_bFailed = false;    // the last write or read failed other than by a time-out
     std::string m_strAnswer;   // the answer being handed out, from m_nAnswerAt on
     std::size_t m_nAnswerAt = 0;
-    std::size_t m_nCapacity; // buffer size the next answer is read with
+    std::vector<char> m_vecBuffer; // what the sensor's answers are read into; grows to fit them
     std::function<void()> m_fSrq;
 };
 

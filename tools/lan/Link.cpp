@@ -44,7 +44,7 @@ std::uintptr_t s_nNextSrq = 1;
 } // namespace
 
 CLink::CLink(CGateway& gateway, CSensor& sensor, ViSession session)
-    : m_cGateway(gateway), m_cSensor(sensor), m_nSession(session), m_nCapacity(FIRST_ANSWER_BUFFER)
+    : m_cGateway(gateway), m_cSensor(sensor), m_nSession(session), m_vecBuffer(FIRST_ANSWER_BUFFER)
 {
 }
 
@@ -169,13 +169,13 @@ ViStatus CLink::fetchAnswer(unsigned long ioTimeout, unsigned long lockTimeout, 
             ViStatus s = setTimeout(std::min(left, READ_SLICE_MS));
             ViUInt32 count = 0;
             if (s >= VI_SUCCESS) {
-                m_strAnswer.resize(m_nCapacity);
-                s = viRead(m_nSession, reinterpret_cast<ViPBuf>(&m_strAnswer[0]), static_cast<ViUInt32>(m_nCapacity),
-                           &count);
-                m_strAnswer.resize(s >= VI_SUCCESS ? count : 0);
+                s = viRead(m_nSession, reinterpret_cast<ViPBuf>(m_vecBuffer.data()),
+                           static_cast<ViUInt32>(m_vecBuffer.size()), &count);
+                if (s >= VI_SUCCESS)
+                    m_strAnswer.assign(m_vecBuffer.data(), count);
             }
-            if (s == VI_ERROR_USER_BUF && m_nCapacity < LARGEST_ANSWER) {
-                m_nCapacity = std::min(m_nCapacity * 4, LARGEST_ANSWER); // the sensor keeps the answer
+            if (s == VI_ERROR_USER_BUF && m_vecBuffer.size() < LARGEST_ANSWER) {
+                m_vecBuffer.resize(std::min(m_vecBuffer.size() * 4, LARGEST_ANSWER)); // the sensor keeps the answer
                 continue;
             }
             if (s != VI_ERROR_TMO || left <= READ_SLICE_MS || gone()) {
