@@ -18,28 +18,29 @@ const char* s_pFolder = nullptr;
 
 void* control(void*)
 {
-    for (;;) {
-        std::FILE* in = std::fopen((std::string(s_pFolder) + "/ctl").c_str(), "r");
-        if (in == nullptr)
-            return nullptr;
-        char line[256];
-        while (std::fgets(line, sizeof line, in) != nullptr) {
-            char type[64];
-            char serial[64];
-            long rc = -1;
-            if (std::sscanf(line, "detach %63s", serial) == 1) {
-                rc = PmxSimDetach(serial);
-            } else if (std::sscanf(line, "attach %63s %63s", type, serial) == 2) {
-                rc = PmxSimAttach(type, serial);
-            }
-            std::FILE* out = std::fopen((std::string(s_pFolder) + "/ack").c_str(), "w");
-            if (out == nullptr)
-                return nullptr;
-            std::fprintf(out, "%ld\n", rc);
-            std::fclose(out);
+    // Opened for reading and writing, the FIFO always has a writer: a command sent while the
+    // last writer is closing is never lost with the pipe's buffer.
+    std::FILE* in = std::fopen((std::string(s_pFolder) + "/ctl").c_str(), "r+");
+    if (in == nullptr)
+        return nullptr;
+    char line[256];
+    while (std::fgets(line, sizeof line, in) != nullptr) {
+        char type[64];
+        char serial[64];
+        long rc = -1;
+        if (std::sscanf(line, "detach %63s", serial) == 1) {
+            rc = PmxSimDetach(serial);
+        } else if (std::sscanf(line, "attach %63s %63s", type, serial) == 2) {
+            rc = PmxSimAttach(type, serial);
         }
-        std::fclose(in);
+        std::FILE* out = std::fopen((std::string(s_pFolder) + "/ack").c_str(), "w");
+        if (out == nullptr)
+            break;
+        std::fprintf(out, "%ld\n", rc);
+        std::fclose(out);
     }
+    std::fclose(in);
+    return nullptr;
 }
 
 __attribute__((constructor)) void startControl()

@@ -28,7 +28,8 @@ def sim(control, command):
     with open(control + "/ctl", "w") as ctl:
         ctl.write(command + "\n")
     with open(control + "/ack") as ack:
-        assert ack.readline().strip() == "0", command
+        answer = ack.readline().strip()
+    assert answer == "0", (command, answer)
 
 
 def socket_queries_at_once(base):
