@@ -63,6 +63,8 @@ echo "leak:libtirpc.so" >"$work/lsan.supp"
 echo "race:libtirpc.so" >"$work/tsan.supp"
 export LSAN_OPTIONS="suppressions=$work/lsan.supp${LSAN_OPTIONS:+:$LSAN_OPTIONS}"
 export TSAN_OPTIONS="suppressions=$work/tsan.supp${TSAN_OPTIONS:+:$TSAN_OPTIONS}"
+# The preloaded control library comes before the AddressSanitizer runtime (its own dependency).
+export ASAN_OPTIONS="verify_asan_link_order=0${ASAN_OPTIONS:+:$ASAN_OPTIONS}"
 
 listing=$(timeout 60 "$gateway" --list 2>/dev/null) || fail "--list failed"
 echo "$listing" | grep -q '^inst0 100000 LBPMX::0x0003::100000::INSTR$' || fail "--list printed: $listing"

@@ -18,10 +18,12 @@ const char* s_pFolder = nullptr;
 
 void* control(void*)
 {
-    // Opened for reading and writing, the FIFO always has a writer: a command sent while the
-    // last writer is closing is never lost with the pipe's buffer.
+    // Both FIFOs stay open for reading and writing, so each always has a writer and a reader:
+    // a command sent while the last writer is closing is never lost with the pipe's buffer, and
+    // a reader of the answer never meets the end of the last answer's writer instead of its own.
     std::FILE* in = std::fopen((std::string(s_pFolder) + "/ctl").c_str(), "r+");
-    if (in == nullptr)
+    std::FILE* out = std::fopen((std::string(s_pFolder) + "/ack").c_str(), "r+");
+    if (in == nullptr || out == nullptr)
         return nullptr;
     char line[256];
     while (std::fgets(line, sizeof line, in) != nullptr) {
@@ -33,12 +35,10 @@ void* control(void*)
         } else if (std::sscanf(line, "attach %63s %63s", type, serial) == 2) {
             rc = PmxSimAttach(type, serial);
         }
-        std::FILE* out = std::fopen((std::string(s_pFolder) + "/ack").c_str(), "w");
-        if (out == nullptr)
-            break;
         std::fprintf(out, "%ld\n", rc);
-        std::fclose(out);
+        std::fflush(out);
     }
+    std::fclose(out);
     std::fclose(in);
     return nullptr;
 }
