@@ -4,8 +4,8 @@
 #include <rpc/pmap_clnt.h>
 
 #include <algorithm>
-#include <cstring>
 #include <atomic>
+#include <cstring>
 #include <map>
 #include <mutex>
 #include <set>
