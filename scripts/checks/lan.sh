@@ -2,7 +2,8 @@
 # End-to-end check of the LAN gateway with a VISA client that knows nothing of the passport:
 # starts rpcbind (when none runs; only the one started here is stopped again), starts
 # lbpmx-lan of the native build against the built runtime, passport and simulated sensors
-# (the two default sensors), runs tests/lan_pyvisa.py with Debian's pyvisa-py, then stops the
+# (the two default sensors), checks that a second gateway refuses to start beside it, runs
+# tests/lan_pyvisa.py and tests/tools/lan/lan_faults.py with Debian's pyvisa-py, then stops the
 # gateway with SIGTERM and expects a clean exit that also leaves rpcbind. Every wait is bounded.
 # LB_DEV_BUILD_DIR chooses another build folder.
 set -uo pipefail
@@ -62,6 +63,8 @@ echo "leak:libtirpc.so" >"$work/lsan.supp"
 echo "race:libtirpc.so" >"$work/tsan.supp"
 export LSAN_OPTIONS="suppressions=$work/lsan.supp${LSAN_OPTIONS:+:$LSAN_OPTIONS}"
 export TSAN_OPTIONS="suppressions=$work/tsan.supp${TSAN_OPTIONS:+:$TSAN_OPTIONS}"
+# The preloaded control library comes before the AddressSanitizer runtime (its own dependency).
+export ASAN_OPTIONS="verify_asan_link_order=0${ASAN_OPTIONS:+:$ASAN_OPTIONS}"
 
 listing=$(timeout 60 "$gateway" --list 2>/dev/null) || fail "--list failed"
 echo "$listing" | grep -q '^inst0 100000 LBPMX::0x0003::100000::INSTR$' || fail "--list printed: $listing"
@@ -73,7 +76,23 @@ LD_PRELOAD="$shim" LBPMX_LAN_SIMCTL="$work" "$gateway" --config "$work/lan.conf"
 gateway_pid=$!
 wait_for "grep -q 'serving' '$work/gateway.log' 2>/dev/null" || fail "the gateway did not start"
 
+# A second gateway refuses to start while this one serves, and leaves its registration alone.
+registration() { timeout 5 rpcinfo -p 127.0.0.1 2>/dev/null | grep ' 395183 '; }
+registered=$(registration)
+[ -n "$registered" ] || fail "not registered with rpcbind"
+timeout 60 "$gateway" --socket-port "$((base + 2))" --log "$work/second.log"
+rc=$?
+[ "$rc" -eq 1 ] && grep -q "another VXI-11 server is registered with rpcbind on port .* and running; not starting" \
+  "$work/second.log" || fail "a second gateway started beside a running one (exit $rc)"
+[ "$(registration)" = "$registered" ] || fail "a second gateway changed the registration: $(registration)"
+
 timeout 240 /usr/bin/python3 -I tests/lan_pyvisa.py "$base" "$work" || fail "pyvisa-py test"
+timeout 240 /usr/bin/python3 -I tests/tools/lan/lan_faults.py "$base" "$work" || fail "pyvisa-py fault cases"
+grep -q "socket inst1: 127.0.0.1 closed, the sensor's session is gone" "$work/gateway.log" \
+  || fail "no log line for the closed socket of a replugged sensor"
+grep -q "link [0-9]*: 127.0.0.1 closed inst0$" "$work/gateway.log" \
+  && grep -q "link [0-9]*: 127.0.0.1 closed inst0, its connection ended$" "$work/gateway.log" \
+  || fail "no log lines for closed VXI-11 links"
 
 kill -TERM "$gateway_pid"
 rc=0

@@ -2,10 +2,12 @@
 
 #include "tools/lan/Socket.h"
 
+#include <algorithm>
 #include <cstdarg>
 #include <cstdlib>
 #include <ctime>
 #include <fstream>
+#include <iterator>
 #include <sstream>
 
 namespace LbPmxLan {
@@ -182,6 +184,12 @@ bool parseConfig(int argc, char** argv, CLanConfig& config, std::string& error, 
         }
         std::string key = arg.substr(2);
         bool flag = key == "no-vxi11" || key == "no-register" || key == "list";
+        static const char* const VALUE_KEYS[] = {"config",       "bind", "allow",       "max-links",
+                                                 "idle-timeout", "log",  "socket-port", "vxi11-port"};
+        if (!flag && std::find(std::begin(VALUE_KEYS), std::end(VALUE_KEYS), key) == std::end(VALUE_KEYS)) {
+            error = "unknown option " + arg;
+            return false;
+        }
         if (!flag && i + 1 >= argc) {
             error = arg + " needs a value";
             return false;

@@ -2,14 +2,16 @@
 // viFindRsrc, named inst0, inst1, ... in the order first seen and remembered by serial, so a
 // replugged sensor gets its old name back) and the links that clients hold on them. Each link
 // is a VISA session of its own, so VISA's lock rules hold between links; the I/O of one sensor
-// runs one operation at a time, in turn, instead of refusing the second as busy. Every
-// operation answers a VXI-11 error code, which the raw socket listener uses as well.
+// runs one operation (or one raw-socket query, write and read) at a time, in turn, instead of
+// refusing the second as busy. Every operation answers a VXI-11 error code, which the raw
+// socket listener uses as well.
 #ifndef LBPMX_LAN_GATEWAY_H
 #define LBPMX_LAN_GATEWAY_H
 
 #include <visa.h>
 
 #include <atomic>
+#include <chrono>
 #include <condition_variable>
 #include <cstdint>
 #include <functional>
@@ -47,10 +49,12 @@ struct CSensor {
     std::string m_strResource;
     bool m_bPresent = false;
     unsigned m_nLinks = 0;
-    bool m_bBusy = false; // one I/O operation at a time; guarded by the gateway's mutex
+    bool m_bBusy = false; // one I/O operation (or socket query) at a time; guarded by the gateway's mutex
 };
 
 class CGateway;
+
+typedef std::chrono::steady_clock Clock;
 
 // One client's link on a sensor. Not thread-safe by itself: a connection uses its links from
 // its one thread (the SRQ handler only reads the fields it was given at enable).
@@ -60,15 +64,24 @@ public:
     ~CLink(); // releases the lock, disables events and closes the VISA session
     long write(const char* data, std::size_t size, unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock,
                unsigned long& written);
-    // Reads up to `max` bytes; `termChar` >= 0 ends the answer after that byte (the rest is kept
-    // for the next read). reason: VXI-11 END / CHR / REQCNT bits. `gone` is asked between slices
-    // of a long wait, so a vanished client frees its link early.
+    // Reads up to `max` bytes of the answer; `termChar` >= 0 ends the piece after that byte.
+    // The whole answer is read from the sensor into the link and handed out in pieces: reason
+    // REQCNT while more remains, END with the last piece, CHR at the termination character.
+    // What remains is dropped by the link's next write or clear. `gone` is asked between
+    // slices of a long wait, so a vanished client frees its link early.
     long read(std::size_t max, unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock, int termChar,
               const std::function<bool()>& gone, std::string& data, long& reason);
     long readStb(unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock, unsigned char& stb);
     long trigger(unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock);
     long clear(unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock);
     long lock(unsigned long lockTimeout, bool waitLock);
+    // Takes the sensor's I/O turn (waiting up to ioTimeout) and keeps it across this link's
+    // operations until endTurn, so that a write and the read of its answer run as one unit.
+    long beginTurn(unsigned long ioTimeout);
+    void endTurn();
+    // After a failed operation: true when the session failed because its sensor is gone (an
+    // unplugged sensor's sessions stay dead even when it returns).
+    bool sensorGone();
     long unlock();
     // Calls `srq` (on the VISA runtime's handler thread) whenever the sensor requests service.
     long enableSrq(bool enable, std::function<void()> srq);
@@ -82,6 +95,11 @@ private:
     ViStatus exclusive(unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock,
                        const std::function<ViStatus()>& op);
     ViStatus setTimeout(unsigned long ms);
+    bool waitTurn(std::unique_lock<std::mutex>& guard, Clock::time_point deadline);
+    void giveTurn(std::unique_lock<std::mutex>& guard);
+    ViStatus fetchAnswer(unsigned long ioTimeout, unsigned long lockTimeout, bool waitLock,
+                         const std::function<bool()>& gone);
+    void dropAnswer();
 
     CGateway& m_cGateway;
     CSensor& m_cSensor;
@@ -89,7 +107,11 @@ private:
     bool m_bLocked = false;
     std::uintptr_t m_nSrqId = 0; // the handler's number while service requests are enabled
     unsigned long m_nTimeout = 0;
-    std::string m_strPending; // read data beyond a termination character
+    bool m_bHoldsTurn = false; // between beginTurn and endTurn
+    bool m_bFailed = false;    // the last write or read failed other than by a time-out
+    std::string m_strAnswer;   // the answer being handed out, from m_nAnswerAt on
+    std::size_t m_nAnswerAt = 0;
+    std::vector<char> m_vecBuffer; // what the sensor's answers are read into; grows to fit them
     std::function<void()> m_fSrq;
 };
 
@@ -117,6 +139,7 @@ private:
     ViSession m_nRm = VI_NULL;
     std::mutex m_cMutex;                // guards the sensor table, link counts and busy flags
     std::condition_variable m_cChanged; // a sensor's I/O finished or a lock was released
+    std::uint64_t m_nReleases = 0;      // such releases, counted so that a waiter never misses one
     std::vector<std::unique_ptr<CSensor>> m_vecSensors;
     std::map<std::string, std::string> m_mapSerialOf; // resource string -> serial
 };

@@ -1,5 +1,7 @@
 #include "tools/lan/SocketListener.h"
 
+#include <cstring>
+
 #include "tools/lan/Config.h"
 #include "tools/lan/Gateway.h"
 #include "tools/lan/LineReader.h"
@@ -35,8 +37,9 @@ void serveSocket(CGateway& gateway, unsigned index, CConnection& connection, CLa
     long error = VXI11_OK;
     std::unique_ptr<CLink> link = gateway.open("inst" + std::to_string(index), error);
     if (!link) {
-        static const char text[] = "ERROR: sensor not available\n";
-        connection.writeAll(text, sizeof text - 1);
+        const char* text =
+            error == VXI11_OUT_OF_RESOURCES ? "ERROR: link limit reached\n" : "ERROR: sensor not available\n";
+        connection.writeAll(text, std::strlen(text));
         log.line("socket inst%u: %s refused (error %ld)", index, connection.peerText().c_str(), error);
         return;
     }
@@ -52,10 +55,26 @@ void serveSocket(CGateway& gateway, unsigned index, CConnection& connection, CLa
                 continue;
             std::string command = line + "\n";
             unsigned long written = 0;
-            long status = link->write(command.data(), command.size(), SOCKET_IO_TIMEOUT_MS, 0, false, written);
+            bool answered = false;
+            // The write and the read of its answer hold the sensor's turn together, so that
+            // another client's query cannot take this answer or slip in between.
+            long status = link->beginTurn(SOCKET_IO_TIMEOUT_MS);
+            if (status == VXI11_OK) {
+                status = link->write(command.data(), command.size(), SOCKET_IO_TIMEOUT_MS, 0, false, written);
+                answered = status == VXI11_OK && isQuery(line) && readAnswer(*link, connection, answer);
+                link->endTurn();
+            }
             if (status != VXI11_OK) {
                 log.line("socket inst%u: \"%s\" failed (error %ld)", index, line.c_str(), status);
-            } else if (isQuery(line) && readAnswer(*link, connection, answer)) {
+            }
+            if (status != VXI11_OK || (isQuery(line) && !answered)) {
+                if (link->sensorGone()) {
+                    // Closing tells the client; a new connection gets a session on the sensor.
+                    log.line("socket inst%u: %s closed, the sensor's session is gone", index,
+                             connection.peerText().c_str());
+                    return;
+                }
+            } else if (answered) {
                 answer += '\n';
                 if (!connection.writeAll(answer.data(), answer.size()))
                     return;

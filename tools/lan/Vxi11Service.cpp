@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <atomic>
+#include <cstring>
 #include <map>
 #include <mutex>
 #include <set>
@@ -18,6 +19,9 @@ namespace LbPmxLan {
 namespace {
 
 constexpr int SRQ_CONNECT_TIMEOUT_MS = 2000;
+// How long the check whether a registered VXI-11 server still runs waits for its answer.
+constexpr int PROBE_CONNECT_TIMEOUT_MS = 2000;
+constexpr std::uint32_t LOOPBACK = 0x7F000001; // rpcbind registrations are on this machine
 
 std::atomic<long> s_nNextLink{1};
 std::atomic<std::uint32_t> s_nNextXid{1};
@@ -38,8 +42,11 @@ public:
         : m_cGateway(gateway), m_cConnection(connection), m_nAbortPort(abortPort)
     {
     }
+    // The connection ended (closed, vanished or idle): its links go with it.
     ~CCoreConnection() override
     {
+        for (auto& link : m_mapLinks)
+            logClosed(link.first, *link.second, ", its connection ended");
         std::lock_guard<std::mutex> guard(s_cLinksMutex);
         for (auto& link : m_mapLinks)
             s_setLinks.erase(link.first);
@@ -143,6 +150,7 @@ public:
         auto it = m_mapLinks.find(lid);
         if (it == m_mapLinks.end())
             return VXI11_INVALID_LINK;
+        logClosed(lid, *it->second, "");
         m_mapLinks.erase(it);
         std::lock_guard<std::mutex> guard(s_cLinksMutex);
         s_setLinks.erase(lid);
@@ -170,6 +178,11 @@ public:
     long abort(Device_Link) override { return VXI11_NOT_SUPPORTED; }
 
 private:
+    void logClosed(long lid, const CLink& link, const char* why)
+    {
+        m_cGateway.log().line("link %ld: %s closed inst%u%s", lid, m_cConnection.peerText().c_str(),
+                              link.sensor().m_nIndex, why);
+    }
     CLink* find(long lid)
     {
         auto it = m_mapLinks.find(lid);
@@ -241,6 +254,15 @@ CVxi11Service::~CVxi11Service()
 bool CVxi11Service::start()
 {
     CLanLog& log = m_cLog;
+    if (m_cConfig.m_bRegister) {
+        unsigned port = registeredPort();
+        TSocket probe = port != 0 ? socketConnect(LOOPBACK, port, PROBE_CONNECT_TIMEOUT_MS) : NO_SOCKET;
+        if (probe != NO_SOCKET) {
+            socketClose(probe);
+            m_cLog.line("another VXI-11 server is registered with rpcbind on port %u and running; not starting", port);
+            return false;
+        }
+    }
     if (!m_cAbort.start(m_cConfig.m_strBind, 0, [&log](CConnection& c) {
             CAbortConnection device;
             serve(EVxi11Channel::Abort, c, device, log);
@@ -257,24 +279,39 @@ bool CVxi11Service::start()
     }
     m_cLog.line("VXI-11 core channel on %s:%u, abort channel on port %u", m_cConfig.m_strBind.c_str(), m_cCore.port(),
                 abortPort);
-    if (m_cConfig.m_bRegister) {
-        pmap_unset(DEVICE_CORE, DEVICE_CORE_VERSION); // a registration left by a gateway that died
-        m_bRegistered =
-            pmap_set(DEVICE_CORE, DEVICE_CORE_VERSION, IPPROTO_TCP, static_cast<unsigned short>(m_cCore.port())) != 0;
-        if (!m_bRegistered) {
-            m_cLog.line("cannot register with rpcbind; VXI-11 clients will not find the gateway");
-            return false;
-        }
-    }
     return true;
+}
+
+bool CVxi11Service::publish()
+{
+    if (!m_cConfig.m_bRegister)
+        return true;
+    // What is registered now answers nobody (checked at start): a gateway that died left it.
+    pmap_unset(DEVICE_CORE, DEVICE_CORE_VERSION);
+    m_bRegistered =
+        pmap_set(DEVICE_CORE, DEVICE_CORE_VERSION, IPPROTO_TCP, static_cast<unsigned short>(m_cCore.port())) != 0;
+    if (!m_bRegistered) {
+        m_cLog.line("cannot register with rpcbind; VXI-11 clients will not find the gateway");
+    }
+    return m_bRegistered;
+}
+
+unsigned CVxi11Service::registeredPort()
+{
+    sockaddr_in address;
+    std::memset(&address, 0, sizeof address);
+    address.sin_family = AF_INET;
+    address.sin_addr.s_addr = htonl(LOOPBACK);
+    return pmap_getport(&address, DEVICE_CORE, DEVICE_CORE_VERSION, IPPROTO_TCP);
 }
 
 void CVxi11Service::stop()
 {
-    if (m_bRegistered) {
+    // Another gateway may have replaced a registration that looked stale to it; that one stays.
+    if (m_bRegistered && registeredPort() == m_cCore.port()) {
         pmap_unset(DEVICE_CORE, DEVICE_CORE_VERSION);
-        m_bRegistered = false;
     }
+    m_bRegistered = false;
     m_cCore.stop();
     m_cAbort.stop();
 }

@@ -18,11 +18,16 @@ class CVxi11Service {
 public:
     CVxi11Service(CGateway& gateway, const CLanConfig& config, CLanLog& log);
     ~CVxi11Service();
+    // Starts the listeners; false (logged) when they cannot, or when a VXI-11 server registered
+    // with rpcbind answers on its port (a stale registration is replaced by publish).
     bool start();
-    void stop(); // unregisters, closes every connection and link
+    // Registers the core channel with rpcbind, once every listener of the gateway is up.
+    bool publish();
+    void stop(); // unregisters (when the registration is still this one's), closes every connection and link
     unsigned corePort() const { return m_cCore.port(); }
 
 private:
+    static unsigned registeredPort(); // 0: none
     CGateway& m_cGateway;
     const CLanConfig& m_cConfig;
     CLanLog& m_cLog;

@@ -122,7 +122,12 @@ int main(int argc, char** argv)
         bool started = true;
 #endif
         CSocketListeners sockets(gateway, config, log);
-        if (!started || !sockets.update()) {
+        started = started && sockets.update();
+#if defined(LBPMX_LAN_VXI11)
+        // Registered last: clients are sent here only once every listener is up.
+        started = started && (!config.m_bVxi11 || vxi11.publish());
+#endif
+        if (!started) {
             status = 1;
         } else {
             log.line("%s", STOP_HINT);

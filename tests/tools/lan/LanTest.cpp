@@ -38,6 +38,13 @@ TEST(LanConfig, FlagsOverrideTheFileAndBadValuesAreRefused)
     EXPECT_TRUE(config.m_cAllow.allows(ip("10.200.0.1")));
     EXPECT_FALSE(config.m_cAllow.allows(ip("127.0.0.1")));
 
+    const char* bogus[] = {"lbpmx-lan", "--bogus"};
+    EXPECT_FALSE(parseConfig(2, const_cast<char**>(bogus), config, error, help));
+    EXPECT_EQ("unknown option --bogus", error);
+    const char* missing[] = {"lbpmx-lan", "--log"};
+    EXPECT_FALSE(parseConfig(2, const_cast<char**>(missing), config, error, help));
+    EXPECT_EQ("--log needs a value", error);
+
     for (const char* line : {"bind = localhost", "max-links = 0", "idle-timeout = -1", "socket-port = 70000",
                              "allow = 10.0.0.0/33", "allow = 10.0.0", "colour = red", "bind", "list = 1"}) {
         CLanConfig c;

@@ -18,28 +18,29 @@ const char* s_pFolder = nullptr;
 
 void* control(void*)
 {
-    for (;;) {
-        std::FILE* in = std::fopen((std::string(s_pFolder) + "/ctl").c_str(), "r");
-        if (in == nullptr)
-            return nullptr;
-        char line[256];
-        while (std::fgets(line, sizeof line, in) != nullptr) {
-            char type[64];
-            char serial[64];
-            long rc = -1;
-            if (std::sscanf(line, "detach %63s", serial) == 1) {
-                rc = PmxSimDetach(serial);
-            } else if (std::sscanf(line, "attach %63s %63s", type, serial) == 2) {
-                rc = PmxSimAttach(type, serial);
-            }
-            std::FILE* out = std::fopen((std::string(s_pFolder) + "/ack").c_str(), "w");
-            if (out == nullptr)
-                return nullptr;
-            std::fprintf(out, "%ld\n", rc);
-            std::fclose(out);
+    // Both FIFOs stay open for reading and writing, so each always has a writer and a reader:
+    // a command sent while the last writer is closing is never lost with the pipe's buffer, and
+    // a reader of the answer never meets the end of the last answer's writer instead of its own.
+    std::FILE* in = std::fopen((std::string(s_pFolder) + "/ctl").c_str(), "r+");
+    std::FILE* out = std::fopen((std::string(s_pFolder) + "/ack").c_str(), "r+");
+    if (in == nullptr || out == nullptr)
+        return nullptr;
+    char line[256];
+    while (std::fgets(line, sizeof line, in) != nullptr) {
+        char type[64];
+        char serial[64];
+        long rc = -1;
+        if (std::sscanf(line, "detach %63s", serial) == 1) {
+            rc = PmxSimDetach(serial);
+        } else if (std::sscanf(line, "attach %63s %63s", type, serial) == 2) {
+            rc = PmxSimAttach(type, serial);
         }
-        std::fclose(in);
+        std::fprintf(out, "%ld\n", rc);
+        std::fflush(out);
     }
+    std::fclose(out);
+    std::fclose(in);
+    return nullptr;
 }
 
 __attribute__((constructor)) void startControl()
