@@ -17,6 +17,17 @@ bool validMechanism(ViUInt16 nMech, bool bForDisable)
     return nMech != 0 && (nMech & ~(VI_QUEUE | VI_HNDLR | VI_SUSPEND_HNDLR)) == 0;
 }
 
+// The mechanism and context an enable may name.
+ViStatus enableArguments(ViUInt16 nMech, ViEventFilter nContext)
+{
+    if (!validMechanism(nMech, false))
+        return VI_ERROR_INV_MECH;
+    // Suspended handlers are not offered by this runtime.
+    if (nMech & VI_SUSPEND_HNDLR)
+        return VI_ERROR_NSUP_MECH;
+    return nContext != VI_NULL ? VI_ERROR_INV_CONTEXT : VI_SUCCESS;
+}
+
 } // namespace
 
 bool CRuntime::eventTypeKnown(const CSession& cSession, ViEventType nType) const
@@ -185,13 +196,8 @@ ViStatus CRuntime::enableEvent(ViSession nVi, ViEventType nType, ViUInt16 nMech,
         PSession pc = eventSession(nVi, nType, false, nStatus);
         if (!pc)
             return nStatus;
-        if (!validMechanism(nMech, false))
-            return VI_ERROR_INV_MECH;
-        // Suspended handlers are not offered by this runtime.
-        if (nMech & VI_SUSPEND_HNDLR)
-            return VI_ERROR_NSUP_MECH;
-        if (nContext != VI_NULL)
-            return VI_ERROR_INV_CONTEXT;
+        if ((nStatus = enableArguments(nMech, nContext)) != VI_SUCCESS)
+            return nStatus;
         if (nMech & VI_HNDLR) {
             bool bInstalled = false;
             for (const SHandler& s : pc->m_vHandlers)
@@ -232,12 +238,8 @@ ViStatus CRuntime::enableEnabledEvents(ViSession nVi, ViUInt16 nMech, ViEventFil
         PSession pc = eventSession(nVi, VI_ALL_ENABLED_EVENTS, true, nStatus);
         if (!pc)
             return nStatus;
-        if (!validMechanism(nMech, false))
-            return VI_ERROR_INV_MECH;
-        if (nMech & VI_SUSPEND_HNDLR)
-            return VI_ERROR_NSUP_MECH;
-        if (nContext != VI_NULL)
-            return VI_ERROR_INV_CONTEXT;
+        if ((nStatus = enableArguments(nMech, nContext)) != VI_SUCCESS)
+            return nStatus;
         for (const auto& sEnabled : pc->m_mapEnabled)
             if (sEnabled.second != 0)
                 vTypes.push_back(sEnabled.first);
