@@ -154,8 +154,10 @@ ViStatus CLbPmxInstrSesn::viClose()
     }
     if (m_nClosingFromDestructor == 0) {
         m_nClosed = 1;
+        closedObjectPending();
         if (closeWhenIdle()) {
             delete this;
+            closedObjectDestroyed();
         }
     }
     return VI_SUCCESS;
@@ -173,8 +175,11 @@ void CLbPmxInstrSesn::abandonCalls()
 // Releasing the sensor session may close the driver, which is done under the passport lock.
 void CLbPmxInstrSesn::destroyClosed()
 {
-    CPassportLock lock;
-    delete this;
+    {
+        CPassportLock lock;
+        delete this;
+    }
+    closedObjectDestroyed();
 }
 
 // ---- message-based operations

@@ -26,6 +26,11 @@ public:
     CPassportLock& operator=(const CPassportLock&) = delete;
 };
 
+// A session object being closed is counted from its viClose until it is destroyed (by viClose,
+// or by its last call in progress), so that a process detach can wait for it.
+void closedObjectPending();
+void closedObjectDestroyed();
+
 // Process attach: lock, vector table, configuration, adapter attached to the dispatcher.
 // False when the lock or the vector table could not be created.
 bool attachProcess();

@@ -34,27 +34,14 @@ std::set<CBasePassport*> s_cOpenObjects;
 
 LbCore::CLogger s_cLogger = LbCore::CLogManager::getLogger("CLbPmxInstrSesn");
 
-// Entry calls in progress, so that a process detach lets the calls that its closes abandoned
-// leave (and destroy their objects) before the driver and the module's objects go.
-std::atomic<unsigned> s_nCallsInProgress(0);
-LbCore::CMutex s_cCallsLock;
-std::condition_variable s_cCallsLeft;
+// Closed objects that wait for their last call to leave, so that a process detach lets the
+// calls its closes abandoned leave (and destroy their objects) before the driver and the
+// module's objects go.
+std::atomic<unsigned> s_nClosedInUse(0);
+LbCore::CMutex s_cClosedLock;
+std::condition_variable s_cClosedGone;
 // Bounds that wait: a call stuck in the sensor library must not hold the process's exit.
 const std::chrono::seconds CALLS_LEAVE_WAIT(5);
-
-class CEntryCall {
-public:
-    CEntryCall() { ++s_nCallsInProgress; }
-    ~CEntryCall()
-    {
-        if (--s_nCallsInProgress == 0 && s_bDetached) {
-            LbCore::CMutexLock guard(s_cCallsLock);
-            s_cCallsLeft.notify_all();
-        }
-    }
-    CEntryCall(const CEntryCall&) = delete;
-    CEntryCall& operator=(const CEntryCall&) = delete;
-};
 
 // The object the runtime's record of a session holds in the passport's slot, or null.
 CBasePassport* objectOf(ViSession session)
@@ -75,7 +62,6 @@ template <class F> ViStatus forward(ViSession session, F call)
     if (object == nullptr) {
         return VI_ERROR_INV_OBJECT;
     }
-    CEntryCall counted; // outlives the object's call, which may destroy the object as it leaves
     CBasePassport::CCall inProgress(*object);
     return call(*object);
 }
@@ -259,6 +245,19 @@ CNiViSv::THandle getVectorTable()
     return s_hVectorTable;
 }
 
+void closedObjectPending()
+{
+    ++s_nClosedInUse;
+}
+
+void closedObjectDestroyed()
+{
+    if (--s_nClosedInUse == 0) {
+        LbCore::CMutexLock guard(s_cClosedLock);
+        s_cClosedGone.notify_all();
+    }
+}
+
 CPassportLock::CPassportLock()
 {
     CNiViSv::acquireLock(s_hPassportLock, 0xFFFFFFFFu, 0);
@@ -329,8 +328,8 @@ void detachProcess(EDetach kind)
             objects[i]->viClose();
         }
         {
-            std::unique_lock<std::mutex> guard(s_cCallsLock.native());
-            s_cCallsLeft.wait_for(guard, CALLS_LEAVE_WAIT, [] { return s_nCallsInProgress == 0; });
+            std::unique_lock<std::mutex> guard(s_cClosedLock.native());
+            s_cClosedGone.wait_for(guard, CALLS_LEAVE_WAIT, [] { return s_nClosedInUse == 0; });
         }
         CPassportLock lock;
         if (getAdapter().isDriverOpen()) {
